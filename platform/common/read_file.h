@@ -1,0 +1,13 @@
+// Reads whole small files: configurations and the kernel's text files.
+#pragma once
+
+#include <cstddef>
+#include <string>
+
+namespace Platform {
+
+// The content of a file of at most mostBytes. Throws std::system_error with the errno and the
+// path; a larger file is EFBIG.
+std::string readFile(const std::string &path, size_t mostBytes);
+
+}  // namespace Platform

@@ -1,0 +1,112 @@
+// Thin: every call here is one call of SQLite and the check of its answer.
+#include "common/sqlite.h"
+
+#include <new>
+
+namespace Platform {
+
+Database::Database(const std::string &path, Mode mode, int busyMs) {
+  int flags = SQLITE_OPEN_NOMUTEX;
+  switch (mode) {
+    case Mode::kReadOnly:
+      flags |= SQLITE_OPEN_READONLY;
+      break;
+    case Mode::kReadWrite:
+      flags |= SQLITE_OPEN_READWRITE;
+      break;
+    case Mode::kCreate:
+      flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+      break;
+  }
+  sqlite3 *handle = nullptr;
+  const int result = sqlite3_open_v2(path.c_str(), &handle, flags, nullptr);
+  handle_.reset(handle);  // SQLite hands out a handle to close even when it could not open
+  if (result != SQLITE_OK) fail(result);
+  sqlite3_extended_result_codes(handle, 1);
+  sqlite3_busy_timeout(handle, busyMs);
+}
+
+void Database::execute(const char *sql) {
+  const int result = sqlite3_exec(handle_.get(), sql, nullptr, nullptr, nullptr);
+  if (result != SQLITE_OK) fail(result);
+}
+
+void Database::fail(int resultCode) const {
+  if ((resultCode & 0xff) == SQLITE_NOMEM) throw std::bad_alloc();
+  throw SqliteError(resultCode,
+                    handle_ ? sqlite3_errmsg(handle_.get()) : sqlite3_errstr(resultCode));
+}
+
+Statement::Statement(Database &database, std::string_view sql) : database_(database) {
+  sqlite3_stmt *handle = nullptr;
+  const int result = sqlite3_prepare_v3(database.get(), sql.data(), static_cast<int>(sql.size()),
+                                        SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
+  if (result != SQLITE_OK) database.fail(result);
+  handle_.reset(handle);
+}
+
+// A reset repeats the error of the last step, which has been thrown already.
+Run::~Run() {
+  (void)sqlite3_reset(statement_.get());
+}
+
+bool Run::step() {
+  const int result = sqlite3_step(statement_.get());
+  if (result == SQLITE_ROW) return true;
+  if (result == SQLITE_DONE) return false;
+  statement_.database().fail(result);
+}
+
+bool Run::isNull(int column) const {
+  return type(column) == SQLITE_NULL;
+}
+
+std::string Run::text(int column) const {
+  // The text first: asking for it may convert the value, and the size is that of the result.
+  const unsigned char *bytes = sqlite3_column_text(statement_.get(), column);
+  const int size = sqlite3_column_bytes(statement_.get(), column);
+  if (bytes == nullptr) return {};
+  return {reinterpret_cast<const char *>(bytes), static_cast<size_t>(size)};
+}
+
+void Run::bind(int position, int64_t value) {
+  check(sqlite3_bind_int64(statement_.get(), position, value));
+}
+
+void Run::bind(int position, double value) {
+  check(sqlite3_bind_double(statement_.get(), position, value));
+}
+
+void Run::bind(int position, std::string_view text) {
+  // A null pointer would bind NULL instead of an empty text.
+  const char *bytes = text.data() == nullptr ? "" : text.data();
+  check(sqlite3_bind_text64(statement_.get(), position, bytes, text.size(), SQLITE_STATIC,
+                            SQLITE_UTF8));
+}
+
+void Run::bind(int position, std::nullptr_t) {
+  check(sqlite3_bind_null(statement_.get(), position));
+}
+
+void Run::check(int resultCode) const {
+  if (resultCode != SQLITE_OK) statement_.database().fail(resultCode);
+}
+
+Transaction::Transaction(TransactionStatements &statements, Kind kind) : statements_(statements) {
+  Run(kind == Kind::kRead ? statements.read : statements.write).finish();
+}
+
+Transaction::~Transaction() {
+  if (!open_) return;
+  // Some failures have rolled back already; then there is nothing left to do here.
+  if (sqlite3_get_autocommit(statements_.rollback.database().get()) != 0) return;
+  (void)sqlite3_step(statements_.rollback.get());
+  (void)sqlite3_reset(statements_.rollback.get());
+}
+
+void Transaction::commit() {
+  Run(statements_.commit).finish();
+  open_ = false;
+}
+
+}  // namespace Platform

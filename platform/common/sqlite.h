@@ -1,0 +1,135 @@
+// SQLite with owners: a Database, its Statements, one Run of a statement, and a Transaction that is
+// rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
+//
+// Declare a Database before its Statements: they are released before it.
+#pragma once
+
+#include <sqlite3.h>
+
+#include <cstdint>
+#include <memory>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+
+namespace Platform {
+
+class SqliteError : public std::runtime_error {
+ public:
+  SqliteError(int resultCode, const std::string &message)
+      : std::runtime_error(message), code(resultCode & 0xff), extendedCode(resultCode) {}
+
+  const int code;          // SQLITE_BUSY, SQLITE_CORRUPT, ...
+  const int extendedCode;  // the same with its particulars
+};
+
+class Database {
+ public:
+  enum class Mode { kReadOnly, kReadWrite, kCreate };
+
+  // One thread at a time uses a Database and all that belongs to it. busyMs: how long a call waits
+  // for another process before it fails with SQLITE_BUSY.
+  Database(const std::string &path, Mode mode, int busyMs);
+
+  // Runs texts that answer nothing of use, one or several.
+  void execute(const char *sql);
+
+  int64_t lastInsertId() const { return sqlite3_last_insert_rowid(handle_.get()); }
+  int64_t changedRows() const { return sqlite3_changes(handle_.get()); }
+  sqlite3 *get() const { return handle_.get(); }
+
+  // Throws the error that a call on this database has just answered.
+  [[noreturn]] void fail(int resultCode) const;
+
+ private:
+  struct Closer {
+    void operator()(sqlite3 *handle) const { sqlite3_close(handle); }
+  };
+  std::unique_ptr<sqlite3, Closer> handle_;
+};
+
+// A prepared text, to be run any number of times.
+class Statement {
+ public:
+  Statement(Database &database, std::string_view sql);
+
+  Database &database() const { return database_; }
+  sqlite3_stmt *get() const { return handle_.get(); }
+
+ private:
+  struct Finalizer {
+    void operator()(sqlite3_stmt *handle) const { sqlite3_finalize(handle); }
+  };
+  Database &database_;
+  std::unique_ptr<sqlite3_stmt, Finalizer> handle_;
+};
+
+// One run of a statement, with its arguments; the statement is reset on leaving. Texts and blobs
+// are not copied: they must outlive the run. One run of a statement at a time.
+class Run {
+ public:
+  template <typename... Arguments>
+  explicit Run(Statement &statement, const Arguments &...arguments) : statement_(statement) {
+    int position = 0;
+    (bind(++position, arguments), ...);
+  }
+  ~Run();
+  Run(const Run &) = delete;
+  Run &operator=(const Run &) = delete;
+
+  // Goes to the next row; false when there is none.
+  bool step();
+  // For a statement without rows.
+  void finish() {
+    while (step()) {
+    }
+  }
+
+  bool isNull(int column) const;
+  int type(int column) const { return sqlite3_column_type(statement_.get(), column); }
+  int64_t integer(int column) const { return sqlite3_column_int64(statement_.get(), column); }
+  double real(int column) const { return sqlite3_column_double(statement_.get(), column); }
+  std::string text(int column) const;
+
+ private:
+  void bind(int position, int64_t value);
+  void bind(int position, int value) { bind(position, static_cast<int64_t>(value)); }
+  void bind(int position, double value);
+  void bind(int position, std::string_view text);
+  void bind(int position, const char *text) { bind(position, std::string_view(text)); }
+  void bind(int position, const std::string &text) { bind(position, std::string_view(text)); }
+  void bind(int position, std::nullptr_t);
+  void check(int resultCode) const;
+
+  Statement &statement_;
+};
+
+// The texts that begin and end transactions, prepared once for each database.
+class TransactionStatements {
+ public:
+  explicit TransactionStatements(Database &database)
+      : read(database, "BEGIN DEFERRED"),
+        write(database, "BEGIN IMMEDIATE"),
+        commit(database, "COMMIT"),
+        rollback(database, "ROLLBACK") {}
+
+  Statement read, write, commit, rollback;
+};
+
+class Transaction {
+ public:
+  enum class Kind { kRead, kWrite };
+
+  Transaction(TransactionStatements &statements, Kind kind);
+  ~Transaction();
+  Transaction(const Transaction &) = delete;
+  Transaction &operator=(const Transaction &) = delete;
+
+  void commit();
+
+ private:
+  TransactionStatements &statements_;
+  bool open_ = true;
+};
+
+}  // namespace Platform
