@@ -1,0 +1,272 @@
+// Reads and computes an expression in one pass, by functions that mirror the grammar:
+//
+//   expression := operand tail
+//   tail       := ( "*" operand | "/" operand )* [ "+" expression | "-" operand tail ]
+//   operand    := ( "(" expression ")" | number | name | function ) chain
+//   chain      := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
+//
+// So logical words bind tighter than arithmetic, and everything but "*" and "/" groups to the
+// right: `10 - 2 - 3` is 11. Definitions rely on it.
+#include "calc/evaluator.h"
+
+#include <cctype>
+#include <cmath>
+#include <cstdlib>
+#include <cstring>
+#include <string_view>
+
+namespace Calc {
+namespace {
+
+// Deep enough for every text that somebody wrote, shallow enough for the smallest usual stack.
+constexpr int kMaxLevels = 5000;
+
+constexpr const char *kTooDeep = "expression nested too deeply";
+
+bool isSpace(char c) {
+  return std::isspace(static_cast<unsigned char>(c)) != 0;
+}
+bool isNameStart(char c) {
+  return std::isalpha(static_cast<unsigned char>(c)) != 0 || c == '_';
+}
+bool isNamePart(char c) {
+  return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_' || c == '.';
+}
+bool startsWith(const char *text, std::string_view word) {
+  return std::strncmp(text, word.data(), word.size()) == 0;
+}
+bool isTrue(float value) {
+  return value != 0.0F;
+}
+float truth(bool value) {
+  return value ? 1.0F : 0.0F;
+}
+
+const char *skipSpace(const char *at) {
+  while (isSpace(*at)) ++at;
+  return at;
+}
+
+[[noreturn]] void fail(const std::string &message, const char *position) {
+  throw Exception(message, position);
+}
+[[noreturn]] void failExpected(std::string_view name, const char *what, const char *position) {
+  fail(std::string(name) + " expected " + what, position);
+}
+
+// The cursor says where reading stopped. It is a member, not a local of every level, to keep the
+// frames of the recursion small; a procedure that reads inside brackets puts it at the opening
+// one first, because "True" and "False" leave it where they find it.
+class Reader {
+ public:
+  Reader(const char *text, const VariableTable &variables)
+      : variables_(variables), cursor_(text), nextOperator_(text) {}
+
+  float evaluate();
+
+ private:
+  float ParseExpression(const char *start, float addend);
+  float ParseTail(float left);
+  float ParseOperand(const char *start);
+
+  float readParenthesis(const char *open);
+  float readNumber(const char *start);
+  float readNamed(const char *start);
+  float readMinMax(std::string_view name, const char *after);
+  float readCeil(std::string_view name, const char *after);
+  float readNot(const char *after);
+  float readChain(float value);
+  float readAnd(const char *word, float value);
+  float readOr(const char *word, float value);
+  float readIf(const char *word, float value);
+
+  const float *findVariable(std::string_view name) const;
+  void enterLevel(const char *place);
+  void takeOperator(const char *place);
+
+  const VariableTable &variables_;
+  const char *cursor_;
+  const char *nextOperator_;  // an operator before this has been taken already
+  int level_ = 0;             // not restored by an exception, which ends the whole reading
+};
+
+float Reader::evaluate() {
+  const float value = ParseExpression(cursor_, 0.0F);
+  if (*cursor_ != '\0') fail("unexpected char", cursor_);
+  return value;
+}
+
+void Reader::enterLevel(const char *place) {
+  if (++level_ > kMaxLevels) fail(kTooDeep, place);
+}
+
+// Behind an operator, "True" and "False" leave the cursor at that operator, which would be read
+// again without end.
+void Reader::takeOperator(const char *place) {
+  if (place < nextOperator_) fail(kTooDeep, place);
+  nextOperator_ = place + 1;
+}
+
+// expression := operand tail
+float Reader::ParseExpression(const char *start, float addend) {
+  enterLevel(start);
+  const float value = ParseTail(ParseOperand(start)) + addend;
+  --level_;
+  return value;
+}
+
+// tail := ( "*" operand | "/" operand )* [ "+" expression | "-" operand tail ]
+float Reader::ParseTail(float left) {
+  for (;;) {
+    const char *const sign = skipSpace(cursor_);
+    const char *const after = *sign == '\0' ? sign : skipSpace(sign + 1);
+    switch (*sign) {
+      case '+':
+        takeOperator(sign);
+        return ParseExpression(after, left);
+      case '-': {
+        takeOperator(sign);
+        enterLevel(after);
+        const float right = ParseTail(ParseOperand(after));
+        --level_;
+        return left - right;
+      }
+      case '*':
+        takeOperator(sign);
+        left *= ParseOperand(after);
+        break;
+      case '/':
+        takeOperator(sign);
+        left /= ParseOperand(after);
+        break;
+      default:
+        cursor_ = sign;
+        return left;
+    }
+  }
+}
+
+// operand := ( "(" expression ")" | number | name | function ) chain
+float Reader::ParseOperand(const char *start) {
+  if (*start == '(') return readChain(readParenthesis(start));
+  if (isNameStart(*start)) return readChain(readNamed(start));
+  return readChain(readNumber(start));
+}
+
+float Reader::readParenthesis(const char *open) {
+  cursor_ = open;
+  const float value = ParseExpression(skipSpace(open + 1), 0.0F);
+  if (*cursor_ != ')') fail("expected )", cursor_);
+  ++cursor_;
+  return value;
+}
+
+// The sign belongs to the literal: there is no unary minus.
+float Reader::readNumber(const char *start) {
+  char *end = nullptr;
+  const double value = std::strtod(start, &end);
+  if (end == start) fail("Missing numeric value.", start);
+  cursor_ = end;
+  return static_cast<float>(value);
+}
+
+// A variable comes first: it hides every word of the language.
+float Reader::readNamed(const char *start) {
+  const char *after = start;
+  while (isNamePart(*after)) ++after;
+  const std::string_view name(start, static_cast<size_t>(after - start));
+  if (const float *variable = findVariable(name)) {
+    cursor_ = after;
+    return *variable;
+  }
+  if (name == "min" || name == "max") return readMinMax(name, after);
+  if (name == "ceil") return readCeil(name, after);
+  if (name == "not") return readNot(after);
+  // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
+  if (name == "True") return 1.0F;
+  if (name == "False") return 0.0F;
+  fail("unexpected symbol: " + std::string(name), start);
+}
+
+const float *Reader::findVariable(std::string_view name) const {
+  const auto found = variables_.find(std::string(name));
+  return found == variables_.end() ? nullptr : &found->second;
+}
+
+// On a tie, or with a NaN, the first argument wins.
+float Reader::readMinMax(std::string_view name, const char *after) {
+  const char *const open = skipSpace(after);
+  if (*open != '(') failExpected(name, "(", open);
+  cursor_ = open;
+  const float a = ParseExpression(skipSpace(open + 1), 0.0F);
+  if (*cursor_ != ',') failExpected(name, ",", cursor_);
+  const float b = ParseExpression(skipSpace(cursor_ + 1), 0.0F);
+  if (*cursor_ != ')') failExpected(name, ")", cursor_);
+  ++cursor_;
+  const bool second = name == "min" ? b < a : b > a;
+  return second ? b : a;
+}
+
+float Reader::readCeil(std::string_view name, const char *after) {
+  const char *const open = skipSpace(after);
+  if (*open != '(') failExpected(name, "(", open);
+  cursor_ = open;
+  const float value = std::ceil(ParseExpression(skipSpace(open + 1), 0.0F));
+  if (*cursor_ != ')') failExpected(name, ")", cursor_);
+  ++cursor_;
+  return value;
+}
+
+// "not" negates the whole expression that follows: `not x + 1` is not (x + 1).
+float Reader::readNot(const char *after) {
+  return truth(!isTrue(ParseExpression(skipSpace(after), 0.0F)));
+}
+
+// chain := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
+// No check is made that a word ends there: `3order` reads as 3 or der.
+float Reader::readChain(float value) {
+  const char *const word = skipSpace(cursor_);
+  if (startsWith(word, "and")) return readAnd(word, value);
+  if (startsWith(word, "or")) return readOr(word, value);
+  if (startsWith(word, "if")) return readIf(word, value);
+  cursor_ = word;
+  return value;
+}
+
+float Reader::readAnd(const char *word, float value) {
+  takeOperator(word);
+  enterLevel(word);
+  const float right = ParseOperand(skipSpace(word + 3));
+  --level_;
+  return ParseTail(truth(isTrue(value) && isTrue(right)));
+}
+
+float Reader::readOr(const char *word, float value) {
+  takeOperator(word);
+  enterLevel(word);
+  const float right = ParseOperand(skipSpace(word + 2));
+  --level_;
+  return ParseTail(truth(isTrue(value) || isTrue(right)));
+}
+
+float Reader::readIf(const char *word, float value) {
+  takeOperator(word);
+  enterLevel(word);
+  const float condition = ParseOperand(skipSpace(word + 2));
+  const char *const next = skipSpace(cursor_);
+  const float alternative = startsWith(next, "else") ? ParseOperand(skipSpace(next + 4)) : 0.0F;
+  --level_;
+  return ParseTail(isTrue(condition) ? value : alternative);
+}
+
+}  // namespace
+
+float Evaluate(const char *text, const VariableTable &variables) {
+  return Reader(text, variables).evaluate();
+}
+
+float Evaluate(const std::string &text, const VariableTable &variables) {
+  return Evaluate(text.c_str(), variables);
+}
+
+}  // namespace Calc

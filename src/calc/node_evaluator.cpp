@@ -1,0 +1,61 @@
+// Evaluates "!calc" nodes and gives the faults of their expressions a place in the file.
+#include "calc/node_evaluator.h"
+
+#include <string>
+
+#include "calc/evaluator.h"
+#include "calc/tagged_value.h"
+#include "calc/yaml_node.h"
+#include "loader/exception.h"
+
+namespace Calc {
+namespace {
+
+float evaluateScalar(const YAML::Node &node, const VariableTable &variables) {
+  const std::string text = node.Scalar();
+  try {
+    return Evaluate(text, variables);
+  } catch (const Exception &fault) {
+    throw Loader::Exception(node.Mark(),
+                            std::string(fault.what()) + " at '" + fault.position + "'");
+  }
+}
+
+// The text is read as an expression whatever its tag, and its faults are reported without the
+// rest of the text.
+float evaluateResult(const YAML::Node &result, const VariableTable &variables) {
+  const std::string text = scalarText(result);
+  try {
+    return Evaluate(text, variables);
+  } catch (const Exception &fault) {
+    throw Loader::Exception(result.Mark(), fault.what());
+  }
+}
+
+// Definitions see the caller's variables only, never one another. The last entry is the result,
+// whatever its key: "=" only keeps an entry out of the definitions.
+float evaluateMapping(const YAML::Node &node, const VariableTable &variables) {
+  VariableTable local = variables;
+  YAML::Node last(YAML::NodeType::Undefined);
+  bool empty = true;
+  for (const auto &entry : node) {
+    const std::string key = scalarText(entry.first);
+    if (key != "=") local[key] = NodeToFloat(entry.second, variables);
+    last.reset(entry.second);
+    empty = false;
+  }
+  if (empty) throwInvalidNode();
+  return evaluateResult(last, local);
+}
+
+}  // namespace
+
+float EvaluateNode(const YAML::Node &node, const VariableTable &variables) {
+  requireValid(node);
+  if (isNull(node)) throw Loader::Exception(node.Mark(), "expected scalar or mapping");
+  if (node.IsScalar()) return evaluateScalar(node, variables);
+  if (node.IsMap()) return evaluateMapping(node, variables);
+  throw Loader::Exception(node.Mark(), "expected scalar or mapping");
+}
+
+}  // namespace Calc

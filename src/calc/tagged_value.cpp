@@ -1,0 +1,82 @@
+// Chooses by a value's tag who converts it, and bounds how far one value may lead into others.
+#include "calc/tagged_value.h"
+
+#include <string>
+
+#include "calc/node_evaluator.h"
+#include "calc/yaml_node.h"
+#include "configref/config_reference.h"
+#include "loader/exception.h"
+
+namespace {
+
+// Through an alias a value can hold itself, or hold twice a value that holds twice a value; both
+// would keep the tool busy for ever. Values that somebody wrote stay far below both bounds.
+class Nesting {
+ public:
+  explicit Nesting(const YAML::Node &node) {
+    if (depth_ == 0) conversions_ = 0;
+    if (depth_ >= kMaxDepth || conversions_ >= kMaxConversions) {
+      throw Loader::Exception(node.Mark(), "value nested too deeply");
+    }
+    ++depth_;
+    ++conversions_;
+  }
+  ~Nesting() { --depth_; }
+  Nesting(const Nesting &) = delete;
+  Nesting &operator=(const Nesting &) = delete;
+
+ private:
+  static constexpr int kMaxDepth = 500;
+  static constexpr int kMaxConversions = 100000;
+
+  // The conversions call one another through functions that carry a node and the variables alone.
+  static thread_local int depth_;
+  static thread_local int conversions_;
+};
+
+thread_local int Nesting::depth_ = 0;
+thread_local int Nesting::conversions_ = 0;
+
+struct ToFloat {
+  using Value = float;
+  static float fromCalc(float value) { return value; }
+  static constexpr auto fromConfig = ConfigToFloat;
+};
+
+struct ToBool {
+  using Value = bool;
+  static bool fromCalc(float value) { return value != 0.0F; }
+  static constexpr auto fromConfig = ConfigToBool;
+};
+
+template <typename Value>
+Value plainValue(const YAML::Node &node) {
+  Value value{};
+  if (!YAML::convert<Value>::decode(node, value)) {
+    throw YAML::TypedBadConversion<Value>(node.Mark());
+  }
+  return value;
+}
+
+template <typename Target>
+typename Target::Value convert(const YAML::Node &node, const Calc::VariableTable &variables) {
+  Calc::requireValid(node);
+  const Nesting nesting(node);
+  const std::string tag = Calc::tagOf(node);
+  if (tag == "!calc") return Target::fromCalc(Calc::EvaluateNode(node, variables));
+  if (tag == "!config") return Target::fromConfig(node, variables);
+  if (tag != "?") throw Loader::Exception(node.Mark(), "Unexpected tag " + tag);
+  if (!node.IsScalar()) throw Loader::Exception(node.Mark(), "Node is not a scalar.");
+  return plainValue<typename Target::Value>(node);
+}
+
+}  // namespace
+
+float NodeToFloat(const YAML::Node &node, const Calc::VariableTable &variables) {
+  return convert<ToFloat>(node, variables);
+}
+
+bool NodeToBool(const YAML::Node &node, const Calc::VariableTable &variables) {
+  return convert<ToBool>(node, variables);
+}
