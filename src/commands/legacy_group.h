@@ -1,0 +1,24 @@
+// The kernel calls of the option mode, which answers with statuses where the sub-commands throw.
+#pragma once
+
+#include <cstdint>
+
+#include "platform/knob.h"
+
+namespace Legacy {
+
+struct MemoryReport {
+  int64_t minMB = 0;
+  int64_t maxMB = 0;
+  uint64_t ownPeakKB = 0;       // of the group's reserved minimum
+  uint64_t childrenPeakKB = 0;  // of its children's
+};
+
+// All return 0 or the kernel's status; results are untouched unless it is 0. A parameter list
+// that cannot be made counts as "out of memory".
+KNOB_ReturnStatus lookUpGroup(const char *path, int64_t *id);
+KNOB_ReturnStatus countMemberGroups(int64_t id, int *count);
+KNOB_ReturnStatus readMemoryReport(int64_t id, MemoryReport *report);
+KNOB_ReturnStatus setGroupMemSize(int64_t id, int sizeMB);
+
+}  // namespace Legacy
