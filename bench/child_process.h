@@ -1,0 +1,19 @@
+// Runs a program to its end and says what it cost.
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace Bench {
+
+struct Cost {
+  double wallMicroseconds = 0;
+  double cpuMicroseconds = 0;
+  double peakKB = 0;
+};
+
+// Output goes to /dev/null, errors to our own. Throws std::runtime_error when the program cannot be
+// started or does not end with status 0.
+Cost runProgram(const std::vector<std::string> &commandLine);
+
+}  // namespace Bench

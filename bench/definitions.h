@@ -1,0 +1,13 @@
+// Definition files of any size, such as a program that manages a large host would write.
+#pragma once
+
+#include <cstddef>
+#include <string>
+
+namespace Bench {
+
+// Writes a file of that many pools: services of up to 49 parts each, a parent before its parts,
+// with plain values and expressions mixed. They need a host of 2 MB for each pool.
+void writeDefinitions(const std::string &path, std::size_t pools);
+
+}  // namespace Bench
