@@ -37,24 +37,24 @@ void Database::fail(int resultCode) const {
                     handle_ ? sqlite3_errmsg(handle_.get()) : sqlite3_errstr(resultCode));
 }
 
-Statement::Statement(Database &database, std::string_view sql) : database_(database) {
+void Statement::prepare() {
   sqlite3_stmt *handle = nullptr;
-  const int result = sqlite3_prepare_v3(database.get(), sql.data(), static_cast<int>(sql.size()),
+  const int result = sqlite3_prepare_v3(database_.get(), sql_.data(), static_cast<int>(sql_.size()),
                                         SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
-  if (result != SQLITE_OK) database.fail(result);
+  if (result != SQLITE_OK) database_.fail(result);
   handle_.reset(handle);
 }
 
 // A reset repeats the error of the last step, which has been thrown already.
 Run::~Run() {
-  (void)sqlite3_reset(statement_.get());
+  (void)sqlite3_reset(statement_);
 }
 
 bool Run::step() {
-  const int result = sqlite3_step(statement_.get());
+  const int result = sqlite3_step(statement_);
   if (result == SQLITE_ROW) return true;
   if (result == SQLITE_DONE) return false;
-  statement_.database().fail(result);
+  database_.fail(result);
 }
 
 bool Run::isNull(int column) const {
@@ -63,33 +63,32 @@ bool Run::isNull(int column) const {
 
 std::string Run::text(int column) const {
   // The text first: asking for it may convert the value, and the size is that of the result.
-  const unsigned char *bytes = sqlite3_column_text(statement_.get(), column);
-  const int size = sqlite3_column_bytes(statement_.get(), column);
+  const unsigned char *bytes = sqlite3_column_text(statement_, column);
+  const int size = sqlite3_column_bytes(statement_, column);
   if (bytes == nullptr) return {};
   return {reinterpret_cast<const char *>(bytes), static_cast<size_t>(size)};
 }
 
 void Run::bind(int position, int64_t value) {
-  check(sqlite3_bind_int64(statement_.get(), position, value));
+  check(sqlite3_bind_int64(statement_, position, value));
 }
 
 void Run::bind(int position, double value) {
-  check(sqlite3_bind_double(statement_.get(), position, value));
+  check(sqlite3_bind_double(statement_, position, value));
 }
 
 void Run::bind(int position, std::string_view text) {
   // A null pointer would bind NULL instead of an empty text.
   const char *bytes = text.data() == nullptr ? "" : text.data();
-  check(sqlite3_bind_text64(statement_.get(), position, bytes, text.size(), SQLITE_STATIC,
-                            SQLITE_UTF8));
+  check(sqlite3_bind_text64(statement_, position, bytes, text.size(), SQLITE_STATIC, SQLITE_UTF8));
 }
 
 void Run::bind(int position, std::nullptr_t) {
-  check(sqlite3_bind_null(statement_.get(), position));
+  check(sqlite3_bind_null(statement_, position));
 }
 
 void Run::check(int resultCode) const {
-  if (resultCode != SQLITE_OK) statement_.database().fail(resultCode);
+  if (resultCode != SQLITE_OK) database_.fail(resultCode);
 }
 
 Transaction::Transaction(TransactionStatements &statements, Kind kind) : statements_(statements) {

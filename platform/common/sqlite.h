@@ -11,6 +11,7 @@
 #include <stdexcept>
 #include <string>
 #include <string_view>
+#include <utility>
 
 namespace Platform {
 
@@ -48,19 +49,26 @@ class Database {
   std::unique_ptr<sqlite3, Closer> handle_;
 };
 
-// A prepared text, to be run any number of times.
+// A text to be run any number of times. It is prepared when it is first run, so that a program pays
+// only for what it uses.
 class Statement {
  public:
-  Statement(Database &database, std::string_view sql);
+  Statement(Database &database, std::string sql) : database_(database), sql_(std::move(sql)) {}
 
   Database &database() const { return database_; }
-  sqlite3_stmt *get() const { return handle_.get(); }
+  sqlite3_stmt *get() {
+    if (!handle_) prepare();
+    return handle_.get();
+  }
 
  private:
   struct Finalizer {
     void operator()(sqlite3_stmt *handle) const { sqlite3_finalize(handle); }
   };
+  void prepare();
+
   Database &database_;
+  std::string sql_;
   std::unique_ptr<sqlite3_stmt, Finalizer> handle_;
 };
 
@@ -69,7 +77,8 @@ class Statement {
 class Run {
  public:
   template <typename... Arguments>
-  explicit Run(Statement &statement, const Arguments &...arguments) : statement_(statement) {
+  explicit Run(Statement &statement, const Arguments &...arguments)
+      : database_(statement.database()), statement_(statement.get()) {
     int position = 0;
     (bind(++position, arguments), ...);
   }
@@ -85,10 +94,10 @@ class Run {
     }
   }
 
-  bool isNull(int column) const;
-  int type(int column) const { return sqlite3_column_type(statement_.get(), column); }
-  int64_t integer(int column) const { return sqlite3_column_int64(statement_.get(), column); }
-  double real(int column) const { return sqlite3_column_double(statement_.get(), column); }
+  bool isNull(int column) const { return type(column) == SQLITE_NULL; }
+  int type(int column) const { return sqlite3_column_type(statement_, column); }
+  int64_t integer(int column) const { return sqlite3_column_int64(statement_, column); }
+  double real(int column) const { return sqlite3_column_double(statement_, column); }
   std::string text(int column) const;
 
  private:
@@ -101,10 +110,11 @@ class Run {
   void bind(int position, std::nullptr_t);
   void check(int resultCode) const;
 
-  Statement &statement_;
+  Database &database_;
+  sqlite3_stmt *statement_;
 };
 
-// The texts that begin and end transactions, prepared once for each database.
+// The texts that begin and end transactions, kept for each database.
 class TransactionStatements {
  public:
   explicit TransactionStatements(Database &database)
