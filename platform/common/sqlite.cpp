@@ -57,10 +57,6 @@ bool Run::step() {
   database_.fail(result);
 }
 
-bool Run::isNull(int column) const {
-  return type(column) == SQLITE_NULL;
-}
-
 std::string Run::text(int column) const {
   // The text first: asking for it may convert the value, and the size is that of the result.
   const unsigned char *bytes = sqlite3_column_text(statement_, column);
