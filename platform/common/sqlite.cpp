@@ -4,6 +4,30 @@
 #include <new>
 
 namespace Platform {
+namespace {
+
+// The URI of a path: the one way to tell SQLite that a file is immutable.
+std::string immutableUri(const std::string &path) {
+  std::string uri = "file:";
+  for (const char c : path) {
+    switch (c) {
+      case '%':
+        uri += "%25";
+        break;
+      case '?':
+        uri += "%3f";
+        break;
+      case '#':
+        uri += "%23";
+        break;
+      default:
+        uri += c;
+    }
+  }
+  return uri + "?immutable=1";
+}
+
+}  // namespace
 
 Database::Database(const std::string &path, Mode mode, int busyMs) {
   int flags = SQLITE_OPEN_NOMUTEX;
@@ -17,9 +41,13 @@ Database::Database(const std::string &path, Mode mode, int busyMs) {
     case Mode::kCreate:
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
+    case Mode::kImmutable:
+      flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
+      break;
   }
+  const std::string name = mode == Mode::kImmutable ? immutableUri(path) : path;
   sqlite3 *handle = nullptr;
-  const int result = sqlite3_open_v2(path.c_str(), &handle, flags, nullptr);
+  const int result = sqlite3_open_v2(name.c_str(), &handle, flags, nullptr);
   handle_.reset(handle);  // SQLite hands out a handle to close even when it could not open
   if (result != SQLITE_OK) fail(result);
   sqlite3_extended_result_codes(handle, 1);
