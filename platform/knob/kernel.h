@@ -13,7 +13,7 @@
 #include <string_view>
 #include <vector>
 
-#include "status.h"
+#include "knob/status.h"
 
 namespace Knob {
 

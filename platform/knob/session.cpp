@@ -1,0 +1,29 @@
+// Chooses the kernel. There is no falling back from one to the other: a reservation that is not
+// real must never look like one.
+#include "knob/session.h"
+
+#include "common/key_value_file.h"
+#include "knob/emulated/emulated_kernel.h"
+
+namespace Knob {
+
+Configuration sessionConfiguration() {
+  try {
+    return readConfiguration();
+  } catch (const Platform::ConfigError &error) {
+    throw KernelError(Status::kKernelNotUsable, error.what());
+  }
+}
+
+std::unique_ptr<Kernel> openKernel(const Configuration &configuration) {
+  if (configuration.kernel == Configuration::KernelKind::kLinux) {
+    throw KernelError(Status::kKernelNotUsable, "this build has no Linux kernel support");
+  }
+  return openEmulatedKernel(configuration);
+}
+
+std::unique_ptr<Kernel> openConfiguredKernel() {
+  return openKernel(sessionConfiguration());
+}
+
+}  // namespace Knob
