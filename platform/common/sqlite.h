@@ -26,8 +26,8 @@ class SqliteError : public std::runtime_error {
 
 class Database {
  public:
-  // kImmutable reads a file that nobody is writing: without locks, and without the files that SQLite
-  // puts beside a database. Whoever uses it makes sure that the file really did not change.
+  // kImmutable reads a file that nobody is writing: without locks, and without the files that
+  // SQLite puts beside a database. Whoever uses it makes sure that the file really did not change.
   enum class Mode { kReadOnly, kReadWrite, kCreate, kImmutable };
 
   // One thread at a time uses a Database and all that belongs to it. busyMs: how long a call waits
