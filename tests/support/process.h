@@ -1,0 +1,42 @@
+// Runs one program to its end and keeps what it wrote, byte for byte, and how it ended. Where
+// wanted, the program sees another /etc than this machine's (private_etc.h).
+#pragma once
+
+#include <chrono>
+#include <filesystem>
+#include <map>
+#include <string>
+#include <vector>
+
+namespace Test {
+
+// How the program's two output streams are kept.
+enum class Streams {
+  kApart,
+  kMerged,  // both in ProcessResult::out, in the order in which they were written
+};
+
+struct Command {
+  std::filesystem::path program;                   // a path; nothing is searched
+  std::vector<std::string> arguments;              // without the program's own name
+  std::map<std::string, std::string> environment;  // the whole of it
+  std::string input;
+  std::filesystem::path workingFolder = "/";
+  // The folder that stands in place of /etc for the program, as made by makePrivateEtc();
+  // empty: the machine's own.
+  std::filesystem::path etc;
+  Streams streams = Streams::kApart;
+  std::chrono::seconds limit{120};
+};
+
+struct ProcessResult {
+  std::string out, err;
+  int status = -1;        // the exit status; -1: ended by a signal
+  int signal = 0;         // the signal that ended it; 0: none
+  bool timedOut = false;  // it was still running at the limit, and was killed with its children
+};
+
+// Throws std::system_error when the program can't be started.
+ProcessResult run(const Command &command);
+
+}  // namespace Test

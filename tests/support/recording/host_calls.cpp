@@ -1,0 +1,117 @@
+// Preloaded into a program under test: writes down what it sends to the system log, which it still
+// sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
+// at the second that HOST_CALLS_TIME names and moves only by what the program sleeps.
+#include <dlfcn.h>
+#include <syslog.h>
+#include <time.h>
+#include <unistd.h>
+
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+
+#include "trace.h"
+
+namespace {
+
+using Recording::formatted;
+using Recording::quoted;
+
+void write(const std::string &line) {
+  Recording::record("HOST_CALLS_TRACE", line);
+}
+
+int64_t &microseconds() {
+  static int64_t now = [] {
+    const char *start = getenv("HOST_CALLS_TIME");
+    return static_cast<int64_t>((start == nullptr ? 1000000000.0 : atof(start)) * 1e6);
+  }();
+  return now;
+}
+
+void pass(int64_t nanoseconds) {
+  write(formatted("sleep %ld", static_cast<long>(nanoseconds / 1000)));
+  microseconds() += nanoseconds / 1000;
+}
+
+int64_t nanosecondsOf(const timespec &length) {
+  return static_cast<int64_t>(length.tv_sec) * 1000000000 + length.tv_nsec;
+}
+
+template <typename Function>
+Function *next(const char *name) {
+  return reinterpret_cast<Function *>(dlsym(RTLD_NEXT, name));
+}
+
+void logged(int priority, const char *format, va_list arguments) {
+  char text[8192];
+  vsnprintf(text, sizeof text, format, arguments);
+  write(formatted("syslog %d ", priority) + quoted(text));
+  next<void(int, const char *, ...)>("syslog")(priority, "%s", text);
+}
+
+}  // namespace
+
+#pragma GCC visibility push(default)
+
+extern "C" {
+
+void openlog(const char *ident, int options, int facility) {
+  write("openlog " + quoted(ident) + formatted(" %d %d", options, facility));
+  next<void(const char *, int, int)>("openlog")(ident, options, facility);
+}
+
+void closelog() {
+  write("closelog");
+  next<void()>("closelog")();
+}
+
+void vsyslog(int priority, const char *format, va_list arguments) {
+  logged(priority, format, arguments);
+}
+
+void syslog(int priority, const char *format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  logged(priority, format, arguments);
+  va_end(arguments);
+}
+
+// What the two above are called in a program that was built with _FORTIFY_SOURCE.
+void __vsyslog_chk(int priority, int, const char *format, va_list arguments) {
+  logged(priority, format, arguments);
+}
+
+void __syslog_chk(int priority, int, const char *format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  logged(priority, format, arguments);
+  va_end(arguments);
+}
+
+time_t time(time_t *result) noexcept {
+  const time_t now = static_cast<time_t>(microseconds() / 1000000);
+  if (result != nullptr) *result = now;
+  return now;
+}
+
+int usleep(useconds_t length) {
+  pass(static_cast<int64_t>(length) * 1000);
+  return 0;
+}
+
+int nanosleep(const timespec *length, timespec *) {
+  pass(nanosecondsOf(*length));
+  return 0;
+}
+
+int clock_nanosleep(clockid_t, int flags, const timespec *length, timespec *) {
+  if (flags != 0) abort();  // an absolute time of another clock than this one
+  pass(nanosecondsOf(*length));
+  return 0;
+}
+
+}  // extern "C"
+
+#pragma GCC visibility pop

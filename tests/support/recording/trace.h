@@ -1,0 +1,17 @@
+// The file in which a stand-in library writes down, one line each, the calls that it gets.
+#pragma once
+
+#include <string>
+
+namespace Recording {
+
+// Appends LINE to the file that the environment variable VARIABLE names; does nothing without it.
+void record(const char *variable, const std::string &line);
+
+// What FORMAT and its arguments make, as printf would.
+std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
+
+// TEXT between double quotes, with line ends and quotes written as escapes.
+std::string quoted(const std::string &text);
+
+}  // namespace Recording
