@@ -76,6 +76,7 @@ State &state() {
 }
 
 __attribute__((destructor)) void finish() {
+  if (current == nullptr) return;  // nothing was called
   for (const auto &list : state().lists)
     if (!list->destroyed) write(formatted("MISUSE list #%d was never destroyed", list->number));
   if (const char *path = getenv("RECORDING_KNOB_GROUPS")) {
