@@ -20,6 +20,13 @@ bool isNullWord(const std::string &text) {
   return text == "~" || text == "null" || text == "Null" || text == "NULL";
 }
 
+// Newer releases keep a plain null word under a tag as a scalar, without a trace of whether it was
+// quoted. Older ones make it an untagged null, so that what they keep was quoted and is a text.
+bool keepsTaggedNulls() {
+  static const bool keeps = YAML::Load("!tag ~").IsScalar();
+  return keeps;
+}
+
 bool hasExplicitTag(const YAML::Node &node) {
   const std::string &tag = node.Tag();
   return !tag.empty() && tag != "?" && tag != "!";
@@ -39,10 +46,9 @@ void requireValid(const YAML::Node &node) {
   }
 }
 
-// Newer releases keep a null word under a tag as a scalar, without a trace of whether it was
-// quoted; older ones make it an untagged null.
 bool isNull(const YAML::Node &node) {
-  return node.IsNull() || (node.IsScalar() && hasExplicitTag(node) && isNullWord(node.Scalar()));
+  if (node.IsNull()) return true;
+  return node.IsScalar() && hasExplicitTag(node) && isNullWord(node.Scalar()) && keepsTaggedNulls();
 }
 
 std::string tagOf(const YAML::Node &node) {
