@@ -1,0 +1,22 @@
+// What poolctl-install does, each for several files at once: all of them, or none.
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace Install {
+
+// Each throws a std::exception whose what() is for people and names the file. Everything that was
+// done is undone then; what cannot be undone is reported on standard error.
+
+// Copies each file into the definitions' folder under its own name, after the loader has accepted
+// it.
+void installFiles(const std::vector<std::string> &paths);
+
+// Marks each file where it stands, after the loader has accepted it.
+void markFiles(const std::vector<std::string> &paths);
+
+// Removes the installed files of these names.
+void removeFiles(const std::vector<std::string> &names);
+
+}  // namespace Install
