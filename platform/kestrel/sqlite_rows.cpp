@@ -1,0 +1,173 @@
+// One statement an operation where one is enough. A field's value keeps its own SQLite type.
+#include "kestrel/sqlite_rows.h"
+
+#include <cmath>
+#include <limits>
+
+#include "kestrel/sqlite_schema.h"
+
+namespace Kestrel {
+
+namespace {
+
+using Platform::Database;
+using Platform::Run;
+using Platform::SqliteError;
+using Platform::Statement;
+
+constexpr const char *kList =
+    "SELECT name, type, value, component, \"group\", \"key\", extra"
+    " FROM object LEFT JOIN field ON field.object = object.id"
+    " WHERE (?1 = 0 OR component = ?2) AND (?3 = 0 OR \"group\" = ?4)"
+    " ORDER BY component, \"group\", \"key\", extra, name";
+
+constexpr const char *kAddObject =
+    "INSERT INTO object (component, \"group\", \"key\", extra) VALUES (?1, ?2, ?3, ?4)"
+    " ON CONFLICT DO NOTHING";
+
+constexpr const char *kFindObject =
+    "SELECT id FROM object"
+    " WHERE component = ?1 AND \"group\" = ?2 AND \"key\" = ?3 AND extra = ?4";
+
+constexpr const char *kPutField =
+    "INSERT INTO field (object, name, type, value) VALUES (?1, ?2, ?3, ?4)"
+    " ON CONFLICT (object, name) DO UPDATE SET type = excluded.type, value = excluded.value";
+
+constexpr const char *kRemoveField = "DELETE FROM field WHERE object = ?1 AND name = ?2";
+constexpr const char *kRemoveFields = "DELETE FROM field WHERE object = ?1";
+constexpr const char *kRemoveObject = "DELETE FROM object WHERE id = ?1";
+constexpr const char *kRemoveEmptyObject =
+    "DELETE FROM object WHERE id = ?1 AND NOT EXISTS (SELECT 1 FROM field WHERE object = ?1)";
+
+// A row's type, name and value in the columns 0 to 2. The tables' checks hold unless somebody
+// switched them off or the file is damaged.
+Value valueOf(const Run &row) {
+  const auto type = typeNamed(row.text(1));
+  const int kind = row.type(2);
+  if (type == Type::kInteger && kind == SQLITE_INTEGER) return row.integer(2);
+  if (type == Type::kReal && kind == SQLITE_FLOAT) return row.real(2);
+  if (type == Type::kReal && kind == SQLITE_TEXT && row.text(2) == "nan") {
+    return std::numeric_limits<double>::quiet_NaN();
+  }
+  if (type == Type::kBoolean && kind == SQLITE_INTEGER) return row.integer(2) != 0;
+  if (type == Type::kText && kind == SQLITE_TEXT) return row.text(2);
+  throw SqliteError(SQLITE_CORRUPT, "field \"" + row.text(0) + "\" holds no " + row.text(1));
+}
+
+std::optional<int64_t> findObject(Database &database, const ObjectId &id) {
+  Statement find(database, kFindObject);
+  Run run(find, id.component, id.group, id.key, id.extra);
+  return run.step() ? std::optional(run.integer(0)) : std::nullopt;
+}
+
+int64_t addObject(Database &database, const ObjectId &id) {
+  Statement add(database, kAddObject);
+  Run(add, id.component, id.group, id.key, id.extra).finish();
+  return findObject(database, id).value();
+}
+
+void writeField(Statement &put, int64_t object, const std::string &name, const Value &value) {
+  const std::string_view type = typeName(typeOf(value));
+  if (const auto *integer = std::get_if<int64_t>(&value)) {
+    Run(put, object, name, type, *integer).finish();
+  } else if (const auto *real = std::get_if<double>(&value)) {
+    // SQLite would make NULL of it.
+    if (std::isnan(*real)) {
+      Run(put, object, name, type, "nan").finish();
+    } else {
+      Run(put, object, name, type, *real).finish();
+    }
+  } else if (const auto *truth = std::get_if<bool>(&value)) {
+    Run(put, object, name, type, *truth ? 1 : 0).finish();
+  } else {
+    Run(put, object, name, type, std::get<std::string>(value)).finish();
+  }
+}
+
+bool sameId(const ObjectId &a, const ObjectId &b) {
+  return a.component == b.component && a.group == b.group && a.key == b.key && a.extra == b.extra;
+}
+
+std::string count(Database &database, const char *sql) {
+  Statement statement(database, sql);
+  Run run(statement);
+  (void)run.step();  // a count always has its one row
+  return std::to_string(run.integer(0));
+}
+
+}  // namespace
+
+// A row without a name is an object without fields.
+const char *const kLookUp =
+    "SELECT name, type, value FROM object LEFT JOIN field ON field.object = object.id"
+    " WHERE component = ?1 AND \"group\" = ?2 AND \"key\" = ?3 AND extra = ?4";
+
+std::optional<Fields> lookUp(Statement &statement, const ObjectId &id) {
+  Run row(statement, id.component, id.group, id.key, id.extra);
+  if (!row.step()) return std::nullopt;
+  Fields fields;
+  do {
+    if (!row.isNull(0)) fields.emplace(row.text(0), valueOf(row));
+  } while (row.step());
+  return fields;
+}
+
+std::vector<StoredObject> selectObjects(Database &database, const Selection &selection) {
+  const std::string component = selection.component.value_or("");
+  const std::string group = selection.group.value_or("");
+  Statement list(database, kList);
+  Run row(list, selection.component ? 1 : 0, component, selection.group ? 1 : 0, group);
+  std::vector<StoredObject> objects;
+  while (row.step()) {
+    const ObjectId id{row.text(5), row.text(3), row.text(4), row.text(6)};
+    if (objects.empty() || !sameId(objects.back().id, id)) objects.push_back({id, {}});
+    if (!row.isNull(0)) objects.back().fields.emplace(row.text(0), valueOf(row));
+  }
+  return objects;
+}
+
+void putField(Database &database, const ObjectId &id, const std::string &field,
+              const Value &value) {
+  Statement put(database, kPutField);
+  writeField(put, addObject(database, id), field, value);
+}
+
+bool removeField(Database &database, const ObjectId &id, const std::string &field) {
+  const auto object = findObject(database, id);
+  if (!object) return false;
+  Statement remove(database, kRemoveField);
+  Run(remove, *object, field).finish();
+  if (database.changedRows() == 0) return false;
+  Statement removeEmpty(database, kRemoveEmptyObject);
+  Run(removeEmpty, *object).finish();
+  return true;
+}
+
+bool removeObject(Database &database, const ObjectId &id) {
+  const auto object = findObject(database, id);
+  if (!object) return false;
+  Statement remove(database, kRemoveObject);
+  Run(remove, *object).finish();
+  return true;
+}
+
+void replaceObjects(Database &database, const std::vector<StoredObject> &objects) {
+  Statement clear(database, kRemoveFields);
+  Statement put(database, kPutField);
+  for (const StoredObject &object : objects) {
+    const int64_t id = addObject(database, object.id);
+    Run(clear, id).finish();
+    for (const auto &[name, value] : object.fields) writeField(put, id, name, value);
+  }
+}
+
+std::vector<Detail> describeTables(Database &database) {
+  Statement check(database, "PRAGMA quick_check(1)");
+  Run run(check);
+  if (run.step() && run.text(0) != "ok") throw SqliteError(SQLITE_CORRUPT, run.text(0));
+  return {{"schema", "version " + std::to_string(kSchemaVersion)},
+          {"objects", count(database, "SELECT count(*) FROM object")},
+          {"fields", count(database, "SELECT count(*) FROM field")}};
+}
+
+}  // namespace Kestrel
