@@ -40,8 +40,9 @@ lint:
 
 package:
 	@scripts/install-deps build package
-	@scripts/build release $(PROGRAMS)
-	@cd build && cpack -G DEB
+	@scripts/build package $(PROGRAMS)
+	@cd build/package && cpack -G DEB >cpack.log || { cat cpack.log; exit 1; }
+	@ls build/package/*.deb
 
 # DESTDIR and PREFIX as usual.
 install: all
