@@ -1,12 +1,24 @@
 # Where things go. Outside the system's own folders a program finds the libraries beside it,
 # wherever the whole is put; a library of the same name in LD_LIBRARY_PATH still comes first.
+set(programs)
+set(libraries)
+foreach(name poolctl knobctl kestrelctl poolctl-install)
+  if(TARGET ${name})
+    list(APPEND programs ${name})
+  endif()
+endforeach()
+foreach(name knob kestrelconfig)
+  if(TARGET ${name})
+    list(APPEND libraries ${name})
+  endif()
+endforeach()
 if(NOT CMAKE_INSTALL_PREFIX STREQUAL "/usr")
-  set_target_properties(poolctl knobctl kestrelctl poolctl-install knob kestrelconfig
+  set_target_properties(${programs} ${libraries}
                         PROPERTIES INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
 endif()
-install(TARGETS poolctl knobctl kestrelctl poolctl-install
+install(TARGETS ${programs}
         RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT programs)
-install(TARGETS knob kestrelconfig
+install(TARGETS ${libraries}
         LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT programs NAMELINK_SKIP)
 file(GLOB manual_pages CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/docs/man/*.[1-8])
 foreach(page ${manual_pages})
