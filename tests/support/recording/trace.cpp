@@ -14,7 +14,10 @@ void record(const char *variable, const std::string &line) {
   const char *path = getenv(variable);
   if (path == nullptr) return;
   const int file = open(path, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600);
-  if (file < 0) abort();
+  if (file < 0) {
+    perror(path);
+    abort();
+  }
   const std::string whole = line + "\n";
   if (write(file, whole.data(), whole.size()) != static_cast<ssize_t>(whole.size())) abort();
   close(file);
