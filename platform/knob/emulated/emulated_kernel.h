@@ -30,8 +30,9 @@ struct BootFacts {
 // longer than 4095 bytes), kernel not usable.
 void bootEmulatedKernel(const Configuration &configuration, const BootFacts &facts, bool force);
 
-// Where the configured emulated kernel keeps its state. Throws KernelError: kernel not usable, when
-// the default folder is not safe to use. Makes nothing.
+// Where the configured emulated kernel keeps its state; the default folder is made when it is
+// missing. Throws KernelError: kernel not usable, when that
+// folder is not safe to use.
 std::string emulatedStatePath(const Configuration &configuration);
 
 }  // namespace Knob

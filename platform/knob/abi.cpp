@@ -1,0 +1,148 @@
+// The C functions of the interface. Nothing else in the library is visible from outside, and no
+// exception passes here.
+#include <cstdio>
+#include <memory>
+#include <new>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "knob/live_kernel.h"
+#include "knob/node_ids.h"
+#include "knob/node_table.h"
+#include "knob/param_list.h"
+#include "knob/signature.h"
+#include "knob/status.h"
+#include "platform/knob.h"
+
+using Knob::Kernel;
+using Knob::LiveKernel;
+using Knob::Status;
+
+namespace {
+
+// Runs the body of a function; what it throws becomes the status.
+template <typename F>
+KNOB_ReturnStatus guarded(const F &body) noexcept {
+  try {
+    body();
+    return static_cast<KNOB_ReturnStatus>(Status::kSuccess);
+  } catch (const Knob::KernelError &error) {
+    return static_cast<KNOB_ReturnStatus>(error.status);
+  } catch (const std::bad_alloc &) {
+    return static_cast<KNOB_ReturnStatus>(Status::kOutOfMemory);
+  } catch (...) {
+    return static_cast<KNOB_ReturnStatus>(Status::kFailure);
+  }
+}
+
+template <typename Value>
+void append(KNOB_ParamList *list, const Value &value) {
+  if (list == nullptr || list->entries.size() >= list->capacity) {
+    throw Knob::KernelError(Status::kBadParameter);
+  }
+  list->entries.emplace_back(std::in_place_type<Value>, value);
+}
+
+KNOB_ParamList *instanceList(const std::vector<int64_t> &ids) {
+  auto list =
+      std::make_unique<KNOB_ParamList>(KNOB_ParamList{Knob::ListKind::kInstance, ids.size(), {}});
+  list->entries.assign(ids.begin(), ids.end());
+  return list.release();
+}
+
+}  // namespace
+
+extern "C" {
+
+#pragma GCC visibility push(default)
+
+const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo = Knob::kCpuInfoNode;
+const KNOB_NodeID KNOB_NODE_system_vmLimits = Knob::kVmLimitsNode;
+const KNOB_NodeID KNOB_NODE_system_bootCmdLine = Knob::kBootCmdLineNode;
+const KNOB_NodeID KNOB_NODE_memory_comprehensive = Knob::kMemoryNode;
+const KNOB_NodeID KNOB_NODE_sched_groupPathNameToID = Knob::kPathToIdNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_groupCreate = Knob::kGroupCreateNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_delete = Knob::kGroupDeleteNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_memAllocationInMB = Knob::kMemAllocationNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_cpuAllocationInPct = Knob::kCpuAllocationNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_members_groups = Knob::kMemberGroupsNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_members_worlds = Knob::kMemberWorldsNode;
+const KNOB_NodeID KNOB_NODE_sched_groups_stats_memoryStats = Knob::kMemoryStatsNode;
+
+int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
+  Knob::BuildSignature running, own;
+  // A kernel that is not usable has no signature to differ in; the calls that follow say so.
+  const KNOB_ReturnStatus status = guarded([&] {
+    own = Knob::buildSignature();
+    running = LiveKernel::instance().with([](Kernel &kernel) { return kernel.signature(); });
+  });
+  if (status != 0 || running.md5 == own.md5) return 0;
+
+  if (runningBuild != nullptr && size > 0) {
+    (void)std::snprintf(runningBuild, static_cast<size_t>(size), "%s", running.buildDate.c_str());
+  }
+  if (myBuild != nullptr) *myBuild = Knob::buildDate();
+  return 1;
+}
+
+KNOB_ParamList *KNOB_ParamListCreate(int kind, int capacity) {
+  const bool known = kind == static_cast<int>(Knob::ListKind::kInput) ||
+                     kind == static_cast<int>(Knob::ListKind::kInstance);
+  if (!known || capacity < 0) return nullptr;
+  return new (std::nothrow)
+      KNOB_ParamList{static_cast<Knob::ListKind>(kind), static_cast<size_t>(capacity), {}};
+}
+
+KNOB_ReturnStatus KNOB_ParamListAddInt(KNOB_ParamList *list, int64_t value) {
+  return guarded([&] { append(list, value); });
+}
+
+KNOB_ReturnStatus KNOB_ParamListAddString(KNOB_ParamList *list, const char *text) {
+  return guarded([&] {
+    if (text == nullptr) throw Knob::KernelError(Status::kBadParameter);
+    append(list, std::string(text));
+  });
+}
+
+void KNOB_ParamListDestroy(KNOB_ParamList *list) {
+  delete list;
+}
+
+int KNOB_ParamListNumInstances(const KNOB_ParamList *list) {
+  return list == nullptr ? 0 : static_cast<int>(list->entries.size());
+}
+
+KNOB_ReturnStatus KNOB_Get(KNOB_NodeID node, const KNOB_ParamList *instance, void *output,
+                           size_t outputSize) {
+  return guarded([&] {
+    LiveKernel::instance().with(
+        [&](Kernel &kernel) { Knob::getNode(kernel, node, instance, output, outputSize); });
+  });
+}
+
+KNOB_ReturnStatus KNOB_Set(KNOB_NodeID node, const KNOB_ParamList *instance,
+                           const KNOB_ParamList *input, void *output, size_t outputSize) {
+  return guarded([&] {
+    LiveKernel::instance().with(
+        [&](Kernel &kernel) { Knob::setNode(kernel, node, instance, input, output, outputSize); });
+  });
+}
+
+KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamList *instance,
+                                            KNOB_ParamList **result) {
+  return guarded([&] {
+    const std::vector<int64_t> ids = LiveKernel::instance().with(
+        [&](Kernel &kernel) { return Knob::listNode(kernel, node, instance); });
+    if (result == nullptr) throw Knob::KernelError(Status::kBufferSize);
+    *result = instanceList(ids);
+  });
+}
+
+const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status) {
+  return Knob::statusText(status);
+}
+
+#pragma GCC visibility pop
+
+}  // extern "C"

@@ -1,0 +1,125 @@
+// Starts the emulated kernel: the first use does it with this machine's facts, knobctl with others.
+#include <ctime>
+
+#include "knob/emulated/emulated_kernel.h"
+#include "knob/emulated/first_use.h"
+#include "knob/emulated/schema.h"
+#include "knob/emulated/state_file.h"
+#include "knob/machine_facts.h"
+#include "knob/signature.h"
+
+namespace Knob {
+namespace {
+
+using Platform::Database;
+using Platform::Run;
+using Platform::Statement;
+
+constexpr size_t kLongestCommandLine = 4095;
+
+HostFacts factsToBootWith(const BootFacts &wanted) {
+  constexpr uint64_t kMostMB = UINT64_MAX / 1024;
+  HostFacts facts = readMachineFacts();
+  if (wanted.cpus) facts.cpus = *wanted.cpus;
+  if (wanted.memoryMB && *wanted.memoryMB > kMostMB) {
+    throw KernelError(Status::kBadParameter, "more memory than can be counted in KB");
+  }
+  if (wanted.memoryMB) facts.memoryKB = *wanted.memoryMB * 1024;
+  if (wanted.isVm) facts.isVm = *wanted.isVm;
+  if (wanted.commandLine) facts.bootCommandLine = *wanted.commandLine;
+
+  if (facts.cpus == 0) throw KernelError(Status::kBadParameter, "a machine has at least one CPU");
+  if (facts.memoryKB == 0) throw KernelError(Status::kBadParameter, "a machine has some memory");
+  if (facts.bootCommandLine.size() > kLongestCommandLine) {
+    if (wanted.commandLine) {
+      throw KernelError(Status::kBadParameter, "a command line has at most 4095 bytes");
+    }
+    facts.bootCommandLine.resize(kLongestCommandLine);
+  }
+  return facts;
+}
+
+// Leaves the tree as it is right after a boot.
+void writeBoot(Database &database, const HostFacts &facts, std::optional<uint32_t> maxVms) {
+  database.execute(kEmptyTree);
+  const BuildSignature signature = buildSignature();
+  Statement insert(database,
+                   "INSERT INTO kernel (one, version, cpus, memory_kb, is_vm, command_line, md5, "
+                   "build_date, max_vms) VALUES (1, ?, ?, ?, ?, ?, ?, ?, ?)");
+  // KB of 2^63 and more are kept as negative numbers and read back as what they were.
+  const auto memoryKB = static_cast<int64_t>(facts.memoryKB);
+  const auto write = [&](auto maxVmsOrNull) {
+    Run(insert, kStateVersion, int64_t{facts.cpus}, memoryKB, facts.isVm ? 1 : 0,
+        facts.bootCommandLine, signature.md5, signature.buildDate, maxVmsOrNull)
+        .finish();
+  };
+  if (maxVms) {
+    write(int64_t{*maxVms});
+  } else {
+    write(nullptr);
+  }
+}
+
+void refuseWhileGroupsExist(Database &database) {
+  Statement statement(database, "SELECT COUNT(*) FROM groups WHERE id NOT IN (?, ?)");
+  Run run(statement, kHostId, kOptId);
+  if (run.step() && run.integer(0) > 0) {
+    throw KernelError(Status::kBusy, "the kernel has " + std::to_string(run.integer(0)) +
+                                         " groups; only force ends them");
+  }
+}
+
+void rebootState(const std::string &path, const HostFacts &facts, const BootFacts &wanted,
+                 bool force) {
+  Database database = openState(path);
+  Platform::TransactionStatements statements(database);
+  Platform::Transaction transaction(statements, Platform::Transaction::Kind::kWrite);
+  if (!force) refuseWhileGroupsExist(database);
+  writeBoot(database, facts, wanted.maxVms);
+  transaction.commit();
+}
+
+// Ids that nobody can hold: those of the state that is lost are unknown, but they did not come
+// faster than a thousand in a second.
+void skipLostIds(Database &database) {
+  Statement statement(database, "UPDATE sqlite_sequence SET seq = ? WHERE name = 'groups'");
+  Run(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
+}
+
+}  // namespace
+
+void bootOnFirstUse(const std::string &path) {
+  const BootLock lock(path);
+  if (stateExists(path)) return;  // another process was faster
+  try {
+    buildState(lock, path,
+               [](Database &database) { writeBoot(database, factsToBootWith({}), std::nullopt); });
+  } catch (const Platform::SqliteError &error) {
+    throw KernelError(Status::kKernelNotUsable,
+                      path + ": cannot make the state: " + std::string(error.what()));
+  }
+}
+
+void bootEmulatedKernel(const Configuration &configuration, const BootFacts &wanted, bool force) {
+  const HostFacts facts = factsToBootWith(wanted);
+  const std::string path = emulatedStatePath(configuration);
+  const BootLock lock(path);
+  const bool exists = stateExists(path);
+  try {
+    if (exists) return rebootState(path, facts, wanted, force);
+  } catch (const KernelError &error) {
+    if (error.status != Status::kKernelNotUsable || !force) throw;
+  } catch (const Platform::SqliteError &error) {
+    if (!force) throwStateError(path, error);
+  }
+  try {
+    buildState(lock, path, [&](Database &database) {
+      writeBoot(database, facts, wanted.maxVms);
+      if (exists) skipLostIds(database);
+    });
+  } catch (const Platform::SqliteError &error) {
+    throwStateError(path, error);
+  }
+}
+
+}  // namespace Knob

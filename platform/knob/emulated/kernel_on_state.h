@@ -1,0 +1,59 @@
+// The emulated kernel: the contract's operations on the rows of one state, one transaction each.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "common/sqlite.h"
+#include "knob/emulated/group_store.h"
+#include "knob/emulated/state_file.h"
+#include "knob/kernel.h"
+
+namespace Knob {
+
+class KernelOnState final : public Kernel {
+ public:
+  // maxVms: of a kernel that was booted without a number of its own.
+  KernelOnState(const std::string &path, uint32_t maxVms);
+
+  GroupId lookUp(std::string_view path) override;
+  GroupId create(GroupId parent, std::string_view name) override;
+  void remove(GroupId id) override;
+  Allocation readAllocation(GroupId id, Resource resource) override;
+  void setAllocation(GroupId id, Resource resource, const AllocationChange &change) override;
+  std::vector<GroupId> childGroups(GroupId id) override;
+  std::vector<int64_t> members(GroupId id) override;
+  void join(GroupId id, int64_t pid) override;
+  MemoryStatistics memoryStatistics(GroupId id) override;
+  HostFacts facts() override;
+  BuildSignature signature() override;
+  GroupView view(GroupId id) override;
+  std::vector<Finding> check(bool repair) override;
+
+ private:
+  using Kind = Platform::Transaction::Kind;
+
+  // Runs an operation in one transaction. SQLite's failures become the kernel's.
+  template <typename F>
+  auto transact(Kind kind, const F &operation);
+  // The same for an operation of one statement, which is a transaction by itself.
+  template <typename F>
+  auto alone(const F &operation);
+
+  ResourceRow require(GroupId id, Resource resource);
+  // Makes room, in every group above, for what the group reserves with the wanted allocation.
+  // Refused: nothing has changed.
+  void reserve(GroupId id, Resource resource, const ResourceRow &row, const Allocation &wanted);
+  std::vector<Member> livingMembers(GroupId id);
+  std::vector<Member> livingBelow(GroupId id);
+  bool isBelow(GroupId id, GroupId ancestor);
+  void requireMemoryFor(GroupId id, int64_t maxMB);
+
+  const std::string path_;
+  const uint32_t maxVms_;
+  Platform::Database database_;
+  Platform::TransactionStatements transactions_;
+  GroupStore store_;
+};
+
+}  // namespace Knob

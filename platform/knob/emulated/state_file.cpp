@@ -1,0 +1,170 @@
+// Everything about the state that is a matter of files: places, rights, locks and settings of
+// SQLite.
+#include "knob/emulated/state_file.h"
+
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "knob/emulated/schema.h"
+#include "knob/kernel.h"
+
+namespace Knob {
+namespace {
+
+using Platform::Database;
+using Platform::SqliteError;
+
+// How long a call waits for another process. Operations last microseconds; only a process that
+// was stopped in the middle of one lets others wait.
+constexpr int kBusyMs = 20000;
+
+[[noreturn]] void notUsable(const std::string &path, const std::string &reason) {
+  throw KernelError(Status::kKernelNotUsable, path + ": " + reason);
+}
+
+[[noreturn]] void systemFailure(const std::string &path, const char *tried, int error) {
+  notUsable(path, std::string("cannot ") + tried + ": " + std::strerror(error));
+}
+
+// Makes the folder when it is missing. Nobody but its owner may change what is in it.
+void requireOwnFolder(const std::string &folder, mode_t mode) {
+  if (::mkdir(folder.c_str(), mode) != 0 && errno != EEXIST) {
+    systemFailure(folder, "make the folder", errno);
+  }
+  struct stat status {};
+  if (::lstat(folder.c_str(), &status) != 0) systemFailure(folder, "look at the folder", errno);
+  if (!S_ISDIR(status.st_mode)) notUsable(folder, "is no folder");
+  if (status.st_uid != ::geteuid()) notUsable(folder, "belongs to another user");
+  if ((status.st_mode & 0777 & ~mode) != 0) {
+    notUsable(folder, "is open to other users: remove it, or take their rights away");
+  }
+}
+
+std::string environmentPath(const char *variable) {
+  const char *value = ::secure_getenv(variable);
+  return value != nullptr && *value == '/' ? value : "";
+}
+
+std::string folderOf(const std::string &path) {
+  const size_t slash = path.rfind('/');
+  if (slash == std::string::npos) return ".";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+void removeIfThere(const std::string &path) {
+  if (::unlink(path.c_str()) != 0 && errno != ENOENT) systemFailure(path, "remove", errno);
+}
+
+void removeStateFiles(const std::string &path) {
+  removeIfThere(path + "-wal");
+  removeIfThere(path + "-shm");
+  removeIfThere(path);
+}
+
+void requireVersion(Database &database, const std::string &path) {
+  Platform::Statement statement(database, "SELECT version FROM kernel");
+  Platform::Run run(statement);
+  if (!run.step()) notUsable(path, "is damaged: it does not say which kernel it is of");
+  const int64_t version = run.integer(0);
+  if (version != kStateVersion) {
+    notUsable(path, "is a state of version " + std::to_string(version) + ", this library has " +
+                        std::to_string(kStateVersion));
+  }
+}
+
+}  // namespace
+
+std::string defaultStatePath() {
+  constexpr mode_t kForAllToSee = 0755;
+  constexpr mode_t kPrivate = 0700;
+  std::string folder;
+  mode_t mode = kPrivate;
+  if (::geteuid() == 0) {
+    folder = "/run/knob";
+    mode = kForAllToSee;
+  } else if (const std::string runtime = environmentPath("XDG_RUNTIME_DIR"); !runtime.empty()) {
+    folder = runtime + "/knob";
+  } else {
+    const std::string temporary = environmentPath("TMPDIR");
+    folder = (temporary.empty() ? "/tmp" : temporary) + "/knob-" + std::to_string(::geteuid());
+  }
+  requireOwnFolder(folder, mode);
+  return folder + "/kernel.db";
+}
+
+bool stateExists(const std::string &path) {
+  struct stat status {};
+  if (::stat(path.c_str(), &status) != 0) {
+    if (errno == ENOENT) return false;
+    systemFailure(path, "look at the state", errno);
+  }
+  if (!S_ISREG(status.st_mode)) notUsable(path, "is no regular file");
+  return status.st_size > 0;
+}
+
+BootLock::BootLock(const std::string &statePath) {
+  // The folder itself is locked: a lock file would have to be left behind.
+  const std::string folder = folderOf(statePath);
+  folder_ = Platform::UniqueFd(::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!folder_) systemFailure(folder, "open the folder", errno);
+  while (::flock(folder_.get(), LOCK_EX) != 0) {
+    if (errno != EINTR) systemFailure(folder, "lock the folder", errno);
+  }
+}
+
+void buildState(const BootLock & /*held*/, const std::string &path,
+                const std::function<void(Database &)> &fill) {
+  const std::string beside = path + ".boot";
+  removeStateFiles(beside);  // of a boot that was killed
+  {
+    Database database(beside, Database::Mode::kCreate, kBusyMs);
+    database.execute("PRAGMA synchronous = OFF");
+    database.execute(kStatePragmas);
+    database.execute("BEGIN");
+    database.execute(kStateTables);
+    fill(database);
+    database.execute("COMMIT");
+  }
+  // Left over from a state that is gone, they would be taken for parts of the new one.
+  removeIfThere(path + "-wal");
+  removeIfThere(path + "-shm");
+  if (::rename(beside.c_str(), path.c_str()) != 0) systemFailure(path, "put the state", errno);
+}
+
+Database openState(const std::string &path) {
+  try {
+    Database database(path, Database::Mode::kReadWrite, kBusyMs);
+    // Like a kernel's memory, the state need not outlive the machine.
+    database.execute("PRAGMA synchronous = OFF");
+    database.execute("PRAGMA cache_size = -16384");
+    requireVersion(database, path);
+    return database;
+  } catch (const SqliteError &error) {
+    if (error.code == SQLITE_ERROR) notUsable(path, "is no state of a kernel");
+    notUsable(path, std::string("cannot use the state: ") + error.what());
+  }
+}
+
+void throwStateError(const std::string &path, const SqliteError &error) {
+  const std::string text = path + ": " + error.what();
+  switch (error.code) {
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+    case SQLITE_CANTOPEN:
+      throw KernelError(Status::kKernelNotUsable, text);
+    case SQLITE_READONLY:
+    case SQLITE_PERM:
+      throw KernelError(Status::kPermissionDenied, text);
+    default:
+      throw KernelError(Status::kFailure, text);
+  }
+}
+
+}  // namespace Knob

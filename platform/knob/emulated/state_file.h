@@ -1,0 +1,42 @@
+// The file that holds the emulated kernel's state: where it is, and how it comes to be.
+#pragma once
+
+#include <functional>
+#include <string>
+
+#include "common/sqlite.h"
+#include "common/unique_fd.h"
+
+namespace Knob {
+
+// The default place of the state. root: /run/knob; others: a folder of their own below
+// XDG_RUNTIME_DIR or the temp folder. Makes the folder when it is missing, and refuses one that
+// other users could change. Throws KernelError (kernel not usable).
+std::string defaultStatePath();
+
+// Whether there is something to open: a regular file that is not empty. Throws KernelError (kernel
+// not usable) for what can be no state.
+bool stateExists(const std::string &path);
+
+// Keeps other processes from booting a kernel in the same folder. It is given back when its holder
+// ends, however that happens.
+class BootLock {
+ public:
+  explicit BootLock(const std::string &statePath);
+
+ private:
+  Platform::UniqueFd folder_;
+};
+
+// Makes a state beside its place, fills it, and moves it there whole, so that nobody ever sees half
+// a state. Under the lock.
+void buildState(const BootLock &lock, const std::string &path,
+                const std::function<void(Platform::Database &)> &fill);
+
+// Opens a state that exists and has this library's version. Throws KernelError (kernel not usable).
+Platform::Database openState(const std::string &path);
+
+// Turns a failure of SQLite into the one of the kernel. what: the path of the state.
+[[noreturn]] void throwStateError(const std::string &path, const Platform::SqliteError &error);
+
+}  // namespace Knob

@@ -1,0 +1,197 @@
+// The table of nodes, and the checks that every row gets alike.
+#include "knob/node_table.h"
+
+#include <algorithm>
+#include <cstring>
+
+#include "knob/allocation.h"
+#include "knob/node_ids.h"
+#include "knob/param_list.h"
+#include "knob/records.h"
+
+namespace Knob {
+namespace {
+
+// A caller's buffer may stand at any address.
+template <typename Record>
+void write(const NodeCall &call, const Record &record) {
+  std::memcpy(call.output, &record, sizeof(record));
+}
+
+void getCpuInfo(const NodeCall &call) {
+  const HostFacts facts = call.kernel.facts();
+  CpuInfoRecord record;
+  record.cpus = facts.cpus;
+  record.isVm = facts.isVm ? 1 : 0;
+  write(call, record);
+}
+
+void getVmLimits(const NodeCall &call) {
+  VmLimitsRecord record;
+  record.maxVms = call.kernel.facts().maxVms;
+  write(call, record);
+}
+
+void getBootCommandLine(const NodeCall &call) {
+  const std::string line = call.kernel.facts().bootCommandLine;
+  BootCommandLineRecord record;
+  std::copy_n(line.begin(), std::min(line.size(), record.text.size() - 1), record.text.begin());
+  write(call, record);
+}
+
+void getMemory(const NodeCall &call) {
+  MemoryRecord record;
+  record.physicalKB = call.kernel.facts().memoryKB;
+  write(call, record);
+}
+
+void lookUp(const NodeCall &call) {
+  write(call, call.kernel.lookUp(call.text));
+}
+
+void create(const NodeCall &call) {
+  write(call, call.kernel.create(call.group, call.text));
+}
+
+void remove(const NodeCall &call) {
+  call.kernel.remove(call.group);
+}
+
+void getMemoryAllocation(const NodeCall &call) {
+  const Allocation allocation = call.kernel.readAllocation(call.group, Resource::kMemory);
+  MemoryAllocationRecord record;
+  record.min = allocation.min;
+  record.max = allocation.max;
+  record.shares = allocation.shares;
+  record.minLimit = allocation.minLimit;
+  write(call, record);
+}
+
+void getCpuAllocation(const NodeCall &call) {
+  const Allocation allocation = call.kernel.readAllocation(call.group, Resource::kCpu);
+  CpuAllocationRecord record;
+  record.min = static_cast<int32_t>(allocation.min);
+  record.max = static_cast<int32_t>(allocation.max);
+  record.shares = static_cast<int32_t>(allocation.shares);
+  record.minLimit = static_cast<int32_t>(allocation.minLimit);
+  write(call, record);
+}
+
+template <Resource kResource>
+void setAllocation(const NodeCall &call) {
+  call.kernel.setAllocation(call.group, kResource, parseAllocationChange(kResource, call.settings));
+}
+
+void join(const NodeCall &call) {
+  call.kernel.join(call.group, call.number);
+}
+
+void getMemoryStatistics(const NodeCall &call) {
+  const MemoryStatistics statistics = call.kernel.memoryStatistics(call.group);
+  MemoryStatisticsRecord record;
+  record.ownReservedPeakKB = statistics.ownReservedPeakKB;
+  record.childrenReservedPeakKB = statistics.childrenReservedPeakKB;
+  write(call, record);
+}
+
+std::vector<int64_t> listGroups(Kernel &kernel, GroupId group) {
+  return kernel.childGroups(group);
+}
+
+std::vector<int64_t> listMembers(Kernel &kernel, GroupId group) {
+  return kernel.members(group);
+}
+
+constexpr InputShape kNoInput = InputShape::kNothing;
+
+// id, of a group, get and its size, set with its input and the size of its answer, list
+constexpr std::array<Node, kNodeCount> kNodes = {
+    Node{kCpuInfoNode, false, getCpuInfo, sizeof(CpuInfoRecord), nullptr, kNoInput, 0, nullptr},
+    Node{kVmLimitsNode, false, getVmLimits, sizeof(VmLimitsRecord), nullptr, kNoInput, 0, nullptr},
+    Node{kBootCmdLineNode, false, getBootCommandLine, sizeof(BootCommandLineRecord), nullptr,
+         kNoInput, 0, nullptr},
+    Node{kMemoryNode, false, getMemory, sizeof(MemoryRecord), nullptr, kNoInput, 0, nullptr},
+    Node{kPathToIdNode, false, nullptr, 0, lookUp, InputShape::kOneText, sizeof(GroupId), nullptr},
+    Node{kGroupCreateNode, true, nullptr, 0, create, InputShape::kOneText, sizeof(GroupId),
+         nullptr},
+    Node{kGroupDeleteNode, true, nullptr, 0, remove, kNoInput, 0, nullptr},
+    Node{kMemAllocationNode, true, getMemoryAllocation, sizeof(MemoryAllocationRecord),
+         setAllocation<Resource::kMemory>, InputShape::kSettings, 0, nullptr},
+    Node{kCpuAllocationNode, true, getCpuAllocation, sizeof(CpuAllocationRecord),
+         setAllocation<Resource::kCpu>, InputShape::kSettings, 0, nullptr},
+    Node{kMemberGroupsNode, true, nullptr, 0, nullptr, kNoInput, 0, listGroups},
+    Node{kMemberWorldsNode, true, nullptr, 0, join, InputShape::kOneInt, 0, listMembers},
+    Node{kMemoryStatsNode, true, getMemoryStatistics, sizeof(MemoryStatisticsRecord), nullptr,
+         kNoInput, 0, nullptr},
+};
+
+const Node &nodeOf(KNOB_NodeID id) {
+  const auto node =
+      std::find_if(kNodes.begin(), kNodes.end(), [id](const Node &row) { return row.id == id; });
+  if (node == kNodes.end()) throw KernelError(Status::kBadNode);
+  return *node;
+}
+
+void requireSupport(bool supported) {
+  if (!supported) throw KernelError(Status::kNotSupported);
+}
+
+GroupId instanceOf(const Node &node, const KNOB_ParamList *instance) {
+  if (node.ofGroup) return requireGroupId(instance);
+  requireNoInstance(instance);
+  return 0;
+}
+
+void requireOutput(const void *output, size_t size, size_t needed) {
+  if (needed == 0) return;
+  if (output == nullptr || size < needed) throw KernelError(Status::kBufferSize);
+}
+
+void takeInput(const Node &node, const KNOB_ParamList *input, NodeCall &call) {
+  switch (node.input) {
+    case InputShape::kNothing:
+      return requireNoInput(input);
+    case InputShape::kOneText:
+      call.text = requireOneText(input);
+      return;
+    case InputShape::kOneInt:
+      call.number = requireOneInt(input);
+      return;
+    case InputShape::kSettings:
+      call.settings = requireTexts(input);
+      return;
+  }
+}
+
+}  // namespace
+
+const std::array<Node, kNodeCount> &nodeTable() {
+  return kNodes;
+}
+
+void getNode(Kernel &kernel, KNOB_NodeID id, const KNOB_ParamList *instance, void *output,
+             size_t outputSize) {
+  const Node &node = nodeOf(id);
+  requireSupport(node.get != nullptr);
+  NodeCall call{kernel, instanceOf(node, instance), {}, 0, {}, output};
+  requireOutput(output, outputSize, node.getSize);
+  node.get(call);
+}
+
+void setNode(Kernel &kernel, KNOB_NodeID id, const KNOB_ParamList *instance,
+             const KNOB_ParamList *input, void *output, size_t outputSize) {
+  const Node &node = nodeOf(id);
+  requireSupport(node.set != nullptr);
+  NodeCall call{kernel, instanceOf(node, instance), {}, 0, {}, output};
+  takeInput(node, input, call);
+  requireOutput(output, outputSize, node.setSize);
+  node.set(call);
+}
+
+std::vector<int64_t> listNode(Kernel &kernel, KNOB_NodeID id, const KNOB_ParamList *instance) {
+  const Node &node = nodeOf(id);
+  requireSupport(node.list != nullptr);
+  return node.list(kernel, instanceOf(node, instance));
+}
+
+}  // namespace Knob
