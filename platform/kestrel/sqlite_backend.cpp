@@ -127,8 +127,10 @@ class SqliteBackend : public Backend {
     return session_->file.consistent();
   }
 
+  // The own reader steps aside first: the last connection that closes a file moves the log into it.
   template <typename Change>
   void change(const Change &apply) {
+    session_.reset();
     withPlace(path_, [&] {
       const auto database = openForWriting(path_);
       TransactionStatements statements(*database);
@@ -140,7 +142,7 @@ class SqliteBackend : public Backend {
 
   std::string path_;
   std::chrono::milliseconds timeout_;
-  std::unique_ptr<Session> session_;  // empty: the last opening failed
+  std::unique_ptr<Session> session_;  // empty: closed for a change, or the last opening failed
 };
 
 }  // namespace

@@ -1,0 +1,14 @@
+// The exit statuses of all tools. Scripts test them, so a number never changes its meaning.
+#pragma once
+
+namespace Tools {
+
+enum ExitStatus {
+  kExitSuccess = 0,
+  kExitFailure = 1,   // it was tried and did not work
+  kExitUsage = 2,     // the command line is wrong; nothing was tried
+  kExitNotFound = 3,  // what the command line names does not exist
+  kExitBusy = 4,      // it exists and is in use
+};
+
+}  // namespace Tools

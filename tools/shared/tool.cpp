@@ -1,0 +1,52 @@
+// Nothing here knows what a tool does.
+#include "shared/tool.h"
+
+#include <CLI/App.hpp>
+#include <CLI/Config.hpp>
+#include <CLI/Formatter.hpp>
+#include <exception>
+#include <iostream>
+
+namespace Tools {
+
+namespace {
+
+ExitStatus complain(const CLI::App &app, ExitStatus status, const char *message) {
+  std::cerr << app.get_name() << ": " << message << '\n';
+  return status;
+}
+
+// Help is an exception of the parser too, with exit code 0.
+ExitStatus answerParseError(const CLI::App &app, const CLI::ParseError &error) {
+  if (error.get_exit_code() == 0) {
+    (void)app.exit(error, std::cout, std::cerr);
+    return kExitSuccess;
+  }
+  complain(app, kExitUsage, error.what());
+  std::cerr << "Try '" << app.get_name() << " --help'.\n";
+  return kExitUsage;
+}
+
+ExitStatus act(CLI::App &app, int argc, char **argv, const Action &action) {
+  try {
+    app.parse(argc, argv);
+    if (action) return action();
+    throw CLI::RequiredError("a sub-command");
+  } catch (const CLI::ParseError &error) {
+    return answerParseError(app, error);
+  } catch (const Failure &failure) {
+    return complain(app, failure.status, failure.what());
+  } catch (const std::exception &error) {
+    return complain(app, kExitFailure, error.what());
+  }
+}
+
+}  // namespace
+
+int runTool(CLI::App &app, int argc, char **argv, const Action &action) {
+  const ExitStatus status = act(app, argc, argv, action);
+  if (std::cout.flush()) return status;
+  return complain(app, kExitFailure, "standard output: cannot be written");
+}
+
+}  // namespace Tools

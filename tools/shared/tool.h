@@ -1,0 +1,35 @@
+// The frame of every tool: reads the command line, runs the chosen action, and is the one place
+// that prints an error: "TOOL: what: why" on standard error.
+#pragma once
+
+#include <functional>
+#include <stdexcept>
+#include <string>
+
+#include "shared/exit_status.h"
+
+namespace CLI {
+class App;
+}
+
+namespace Tools {
+
+// Ends the tool with this status and message.
+class Failure : public std::runtime_error {
+ public:
+  Failure(ExitStatus exitStatus, const std::string &message)
+      : std::runtime_error(message), status(exitStatus) {}
+
+  const ExitStatus status;
+};
+
+// What a command line asks for. A sub-command's callback sets it; it runs when the whole line has
+// been found right.
+using Action = std::function<ExitStatus()>;
+
+// Parses the line, runs the action that the parsing has set and answers the exit status; a line
+// that sets none is a usage error. Help goes to standard output; output that cannot be written is a
+// failure.
+int runTool(CLI::App &app, int argc, char **argv, const Action &action);
+
+}  // namespace Tools
