@@ -55,6 +55,10 @@ ProcessResult StandInWorld::poolctl(const Arguments &arguments, Streams streams)
   return World::poolctl(arguments, streams);
 }
 
+bool StandInWorld::ranPoolctl() const {
+  return fs::exists(environment.at("RECORDING_KNOB_TRACE"));
+}
+
 std::vector<std::string> StandInWorld::everyCall() const {
   std::vector<std::string> result;
   for (const std::string &line : lines(readFile(environment.at("RECORDING_KNOB_TRACE"))))

@@ -27,6 +27,8 @@ class StandInWorld : public World {
   // Runs poolctl with empty traces.
   ProcessResult poolctl(const Arguments &arguments, Streams streams = Streams::kApart);
 
+  bool ranPoolctl() const;
+
   // What the last run left.
   std::vector<std::string> everyCall() const;    // but those for texts of statuses
   std::vector<std::string> kernelCalls() const;  // KNOB_Get, KNOB_Set, KNOB_GetInstanceListAlloc
