@@ -13,6 +13,7 @@
 
 #include "installed_mark.h"
 #include "loader/definition_files.h"
+#include "shared/tool.h"
 
 namespace Install {
 namespace {
@@ -38,6 +39,11 @@ void throwSystemError(const std::string &path) {
   throw std::system_error(errno, std::generic_category(), path);
 }
 
+void throwOpenError(const std::string &path) {
+  if (errno != ENOENT) throwSystemError(path);
+  throw Tools::Failure(Tools::kExitNotFound, path + ": " + std::generic_category().message(ENOENT));
+}
+
 DefinitionFolder::DefinitionFolder(IfMissing ifMissing) {
   const char *const path = Loader::kDefinitionFolder;
   if (ifMissing == IfMissing::kCreate) {
@@ -45,7 +51,7 @@ DefinitionFolder::DefinitionFolder(IfMissing ifMissing) {
     if (!created_ && errno != EEXIST) throwSystemError(path);
   }
   fd_ = Platform::UniqueFd(open(path, O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!fd_) throwSystemError(path);
+  if (!fd_) throwOpenError(path);
   // Whatever the umask made of it.
   if (created_ && fchmod(fd(), kFolderMode) != 0) throwSystemError(path);
 }
@@ -82,7 +88,7 @@ StagedFile::~StagedFile() {
 
 void StagedFile::copyAndMark(const std::string &source) {
   const Platform::UniqueFd from(open(source.c_str(), O_RDONLY | O_CLOEXEC));
-  if (!from) throwSystemError(source);
+  if (!from) throwOpenError(source);
   char buffer[65536];
   for (;;) {
     const ssize_t size = read(from.get(), buffer, sizeof buffer);

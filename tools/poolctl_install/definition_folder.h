@@ -11,6 +11,8 @@ namespace Install {
 
 // Throws std::system_error with the errno and the path.
 [[noreturn]] void throwSystemError(const std::string &path);
+// For something that the command line names: throws Tools::Failure when it does not exist.
+[[noreturn]] void throwOpenError(const std::string &path);
 
 class DefinitionFolder {
  public:

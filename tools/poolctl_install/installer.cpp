@@ -16,6 +16,7 @@
 #include "definition_folder.h"
 #include "installed_mark.h"
 #include "loader/definition_files.h"
+#include "shared/tool.h"
 
 namespace Install {
 namespace {
@@ -25,7 +26,7 @@ using Changes = std::vector<std::unique_ptr<EntryChange>>;
 // Names with a leading dot are never read, and a name with a slash would lead elsewhere.
 void checkEntryName(const std::string &name, const std::string &given) {
   if (name.empty() || name[0] == '.' || name.find('/') != std::string::npos)
-    throw std::runtime_error("'" + given + "': no name for an installed file");
+    throw Tools::Failure(Tools::kExitUsage, "'" + given + "': no name for an installed file");
 }
 
 // A second entry of one name would silently take the place of the first.
@@ -36,7 +37,7 @@ std::vector<std::string> entryNames(const std::vector<std::string> &paths) {
     names.push_back(path.substr(path.rfind('/') + 1));
     checkEntryName(names.back(), path);
     if (!seen.insert(names.back()).second)
-      throw std::runtime_error(path + ": another file of this name is given too");
+      throw Tools::Failure(Tools::kExitUsage, path + ": another file of this name is given too");
   }
   return names;
 }
@@ -69,7 +70,7 @@ class MarkChange {
  public:
   explicit MarkChange(const std::string &path)
       : path_(path), file_(open(path.c_str(), O_RDONLY | O_CLOEXEC)) {
-    if (!file_) throwSystemError(path_);
+    if (!file_) throwOpenError(path_);
   }
   void set() {
     before_ = readMark(file_.get());
@@ -91,7 +92,7 @@ class MarkChange {
 void checkIsInstalled(const DefinitionFolder &folder, const std::string &name) {
   struct stat info {};
   if (fstatat(folder.fd(), name.c_str(), &info, AT_SYMLINK_NOFOLLOW) != 0)
-    throwSystemError(DefinitionFolder::pathOf(name));
+    throwOpenError(DefinitionFolder::pathOf(name));
   if (!S_ISREG(info.st_mode))
     throw std::runtime_error(DefinitionFolder::pathOf(name) + ": is no regular file");
 }
@@ -120,13 +121,13 @@ void installFiles(const std::vector<std::string> &paths) {
 }
 
 void markFiles(const std::vector<std::string> &paths) {
-  for (const std::string &path : paths) (void)Loader::readFile(path);
   std::vector<std::unique_ptr<MarkChange>> changes;
+  for (const std::string &path : paths) {
+    changes.push_back(std::make_unique<MarkChange>(path));
+    (void)Loader::readFile(path);
+  }
   try {
-    for (const std::string &path : paths) {
-      changes.push_back(std::make_unique<MarkChange>(path));
-      changes.back()->set();
-    }
+    for (const auto &change : changes) change->set();
   } catch (...) {
     undoAll(changes);
     throw;
