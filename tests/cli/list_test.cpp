@@ -44,6 +44,24 @@ TEST_F(List, TableShowsAPoolsNineValues) {
   expectRun(result, 0, kTableHeader + line, "");
 }
 
+TEST_F(List, EachLineIsWrittenAsSoonAsItIsKnown) {
+  world.hostCalls();
+  world.environment["HOST_CALLS_OUTPUT"] = "seen";
+  const auto file = world.file("pools.yaml", "- name: host/a\n- name: host/b\n");
+  expectRun(world.poolctl({"list", file}), 0,
+            kTableHeader + tableLine({"host/a", "yes", "0", "-", "-", "-", "0", "-", "1000"}) +
+                tableLine({"host/b", "yes", "0", "-", "-", "-", "0", "-", "1000"}),
+            "");
+  EXPECT_EQ(world.hostTrace(), (Calls{"write 153", "write 153", "write 153"}));
+}
+
+TEST_F(List, OutputThatCannotBeWrittenFails) {
+  world.hostCalls();
+  world.environment["HOST_CALLS_OUTPUT"] = "full";
+  const auto file = world.file("pools.yaml", "- name: host/a\n");
+  expectRun(world.poolctl({"list", file}), 1, "", "cannot write to standard output\n");
+}
+
 TEST_F(List, CsvHasNoPadding) {
   EXPECT_EQ(csv("- {name: host/vim, memMin: 512, memShares: -3, cpuMin: -1, cpuShares: -1}\n"),
             "host/vim,yes,512,-,-,normal,-,-,-\n");
