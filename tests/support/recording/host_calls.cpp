@@ -1,10 +1,10 @@
 // Preloaded into a program under test: writes down what it sends to the system log, which it still
 // sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
 // at the second that HOST_CALLS_TIME names and moves only by what the program sleeps. The file that
-// HOST_CALLS_UNREADABLE names cannot be opened, not even by root. HOST_CALLS_OUTPUT, when it is
-// set, has each write to standard output written down ("seen") or refused as on a full disk
-// ("full").
+// HOST_CALLS_UNREADABLE names cannot be opened, not even by root. What is flushed to
+// standard output is written down with its size.
 #include <dlfcn.h>
+#include <stdio_ext.h>
 #include <syslog.h>
 #include <time.h>
 #include <unistd.h>
@@ -126,14 +126,10 @@ int clock_nanosleep(clockid_t, int flags, const timespec *length, timespec *) {
   return 0;
 }
 
-ssize_t write(int file, const void *bytes, size_t size) {
-  const char *output = file == STDOUT_FILENO ? getenv("HOST_CALLS_OUTPUT") : nullptr;
-  if (output != nullptr && strcmp(output, "full") == 0) {
-    errno = ENOSPC;
-    return -1;
-  }
-  if (output != nullptr) note(formatted("write %zu", size));
-  return next<ssize_t(int, const void *, size_t)>("write")(file, bytes, size);
+int fflush(FILE *stream) {
+  const size_t pending = stream == stdout ? __fpending(stream) : 0;
+  if (pending != 0) note(formatted("flush %zu", pending));
+  return next<int(FILE *)>("fflush")(stream);
 }
 
 FILE *fopen(const char *path, const char *mode) {
