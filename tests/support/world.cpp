@@ -24,7 +24,7 @@ void passOn(std::map<std::string, std::string> *environment) {
 
 fs::path binFolder() {
   const char *other = getenv("POOLCTL_BIN");
-  return other == nullptr ? BIN_FOLDER : other;
+  return other == nullptr || *other == 0 ? BIN_FOLDER : other;
 }
 
 fs::path standInFolder(const std::string &name) {

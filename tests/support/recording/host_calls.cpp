@@ -1,14 +1,17 @@
 // Preloaded into a program under test: writes down what it sends to the system log, which it still
 // sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
-// at the second that HOST_CALLS_TIME names and moves only by what the program sleeps.
+// at the second that HOST_CALLS_TIME names and moves only by what the program sleeps. The file that
+// HOST_CALLS_UNREADABLE names cannot be opened, not even by root.
 #include <dlfcn.h>
 #include <syslog.h>
 #include <time.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <string>
 
 #include "trace.h"
@@ -49,6 +52,15 @@ void logged(int priority, const char *format, va_list arguments) {
   vsnprintf(text, sizeof text, format, arguments);
   write(formatted("syslog %d ", priority) + quoted(text));
   next<void(int, const char *, ...)>("syslog")(priority, "%s", text);
+}
+
+FILE *opened(const char *function, const char *path, const char *mode) {
+  const char *unreadable = getenv("HOST_CALLS_UNREADABLE");
+  if (unreadable != nullptr && strcmp(path, unreadable) == 0) {
+    errno = EACCES;
+    return nullptr;
+  }
+  return next<FILE *(const char *, const char *)>(function)(path, mode);
 }
 
 }  // namespace
@@ -110,6 +122,15 @@ int clock_nanosleep(clockid_t, int flags, const timespec *length, timespec *) {
   if (flags != 0) abort();  // an absolute time of another clock than this one
   pass(nanosecondsOf(*length));
   return 0;
+}
+
+FILE *fopen(const char *path, const char *mode) {
+  return opened("fopen", path, mode);
+}
+
+// What the C++ library's file streams open their files with.
+FILE *fopen64(const char *path, const char *mode) {
+  return opened("fopen64", path, mode);
 }
 
 }  // extern "C"
