@@ -123,7 +123,7 @@ class EtcdBackend : public Backend {
   std::vector<Detail> details() override {
     std::vector<Detail> details{{"prefix", prefix_}};
     for (const std::string &endpoint : members_.endpoints()) {
-      details.emplace_back("member " + endpoint, members_.condition(endpoint));
+      details.emplace_back("member", endpoint + ": " + members_.condition(endpoint));
     }
     return details;
   }

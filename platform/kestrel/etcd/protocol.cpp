@@ -187,7 +187,8 @@ std::string readToken(const std::string &json) {
 
 StatusAnswer readStatus(const std::string &json) {
   const Json answer = parseObject(json);
-  return {headerOf(answer), text(answer, "version"), number(answer, "leader") != 0};
+  const std::string leader = text(answer, "leader");  // a member's id, of 64 bits without a sign
+  return {headerOf(answer), text(answer, "version"), !leader.empty() && leader != "0"};
 }
 
 std::optional<Refusal> readRefusal(const std::string &json) {
