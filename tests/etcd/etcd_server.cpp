@@ -118,22 +118,23 @@ std::string EtcdMember::log() const {
   return readFile(logPath_);
 }
 
-Etcd::Etcd(const fs::path &folder, int count, const EtcdOptions &options)
-    : options_(options), folder_(folder) {
-  const std::string scheme = options.tls ? "https://" : "http://";
+Etcd::Etcd(const fs::path &folder, int count, const EtcdOptions &options) {
   std::vector<std::string> clients, peers, cluster;
   for (int i = 0; i < count; ++i) {
-    clients.push_back(scheme + freePlace());
+    clients.push_back("http://" + freePlace());
     peers.push_back("http://" + freePlace());
     cluster.push_back("m" + std::to_string(i) + "=" + peers.back());
   }
   for (int i = 0; i < count; ++i) {
     const std::string name = "m" + std::to_string(i);
     const auto index = static_cast<size_t>(i);
+    std::vector<std::string> listenAt = {clients[index]};
+    if (!options.alsoAt.empty()) listenAt.push_back(options.alsoAt);
+    const std::string listening = joined(listenAt);
     std::vector<std::string> line = {"/usr/bin/etcd",
                                      "--name=" + name,
                                      "--data-dir=" + (folder / (name + ".etcd")).string(),
-                                     "--listen-client-urls=" + clients[index],
+                                     "--listen-client-urls=" + listening,
                                      "--advertise-client-urls=" + clients[index],
                                      "--listen-peer-urls=" + peers[index],
                                      "--initial-advertise-peer-urls=" + peers[index],
@@ -159,7 +160,7 @@ std::vector<std::string> Etcd::urls() const {
 // A read that the whole cluster has to agree on. A server that wants a user has got so far, too.
 void Etcd::awaitReady(size_t index) {
   constexpr long kBadRequest = 400;
-  Kestrel::Etcd::HttpClient client(options_.client);
+  Kestrel::Etcd::HttpClient client{Kestrel::Configuration()};
   const auto end = std::chrono::steady_clock::now() + kMostStart;
   while (std::chrono::steady_clock::now() < end) {
     const auto answer = client.post(member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
@@ -171,7 +172,7 @@ void Etcd::awaitReady(size_t index) {
 }
 
 Kestrel::Configuration Etcd::configuration() const {
-  Kestrel::Configuration result = options_.client;
+  Kestrel::Configuration result;
   result.file = "test";
   result.engine = Kestrel::Engine::kEtcd;
   result.endpoints = urls();
@@ -181,11 +182,7 @@ Kestrel::Configuration Etcd::configuration() const {
 }
 
 std::string Etcd::configurationText() const {
-  std::string text = "store = etcd\nendpoints = " + joined(urls()) + "\ntimeout-ms = 20000\n";
-  const Kestrel::Configuration &client = options_.client;
-  if (!client.cacert.empty()) text += "cacert = " + client.cacert + "\n";
-  if (!client.cert.empty()) text += "cert = " + client.cert + "\nkey = " + client.key + "\n";
-  return text;
+  return "store = etcd\nendpoints = " + joined(urls()) + "\ntimeout-ms = 20000\n";
 }
 
 std::string Etcd::etcdctl(const std::vector<std::string> &arguments,
@@ -193,12 +190,6 @@ std::string Etcd::etcdctl(const std::vector<std::string> &arguments,
   Command command;
   command.program = "/usr/bin/etcdctl";
   command.arguments = {"--endpoints=" + joined(urls()), "--command-timeout=20s"};
-  const Kestrel::Configuration &client = options_.client;
-  if (!client.cacert.empty()) command.arguments.push_back("--cacert=" + client.cacert);
-  if (!client.cert.empty()) {
-    command.arguments.push_back("--cert=" + client.cert);
-    command.arguments.push_back("--key=" + client.key);
-  }
   command.arguments.insert(command.arguments.end(), arguments.begin(), arguments.end());
   command.environment = {{"ETCDCTL_API", "3"}};
   command.input = input;

@@ -21,8 +21,7 @@ std::string freePlace();
 
 struct EtcdOptions {
   std::vector<std::string> arguments;  // more of etcd's own
-  bool tls = false;
-  Kestrel::Configuration client;  // cacert, cert and key with which the servers are asked
+  std::string alsoAt;                  // one more address of the only member, such as an https one
 };
 
 // One etcd process. It is killed in the end.
@@ -71,8 +70,6 @@ class Etcd {
                       const std::string &input = {}) const;
 
  private:
-  EtcdOptions options_;
-  std::filesystem::path folder_;
   std::vector<std::unique_ptr<EtcdMember>> members_;
 };
 

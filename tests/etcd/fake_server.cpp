@@ -68,15 +68,6 @@ std::optional<FakeRequest> readRequest(int fd, int end) {
   }
 }
 
-bool sendAll(int fd, const std::string &text) {
-  for (size_t at = 0; at < text.size();) {
-    const ssize_t count = send(fd, text.data() + at, text.size() - at, MSG_NOSIGNAL);
-    if (count <= 0) return false;
-    at += static_cast<size_t>(count);
-  }
-  return true;
-}
-
 std::string headerText(const std::string &revision, const std::string &cluster) {
   return R"({"header":{"cluster_id":")" + cluster + R"(","member_id":"2","revision":")" + revision +
          R"(","raft_term":"2"})";
@@ -84,8 +75,11 @@ std::string headerText(const std::string &revision, const std::string &cluster) 
 
 }  // namespace
 
-FakeServer::FakeServer(Answer answer)
-    : answer_(std::move(answer)), listener_(listenOn(&place_)), end_(eventfd(0, EFD_CLOEXEC)) {
+FakeServer::FakeServer(Answer answer, std::chrono::milliseconds perByte)
+    : answer_(std::move(answer)),
+      perByte_(perByte),
+      listener_(listenOn(&place_)),
+      end_(eventfd(0, EFD_CLOEXEC)) {
   listening_ = std::thread([this] { serve(); });
 }
 
@@ -117,8 +111,20 @@ void FakeServer::serveConnection(UniqueFd connection) {
   while (const auto request = readRequest(connection.get(), end_.get())) {
     ++requests_;
     const std::string answer = answer_(*request);
-    if (answer.empty() || !sendAll(connection.get(), answer)) return;
+    if (!sendAll(connection.get(), answer)) return;
+    if (answer.empty() || answer.find("Connection: close") != std::string::npos) return;
   }
+}
+
+bool FakeServer::sendAll(int fd, const std::string &text) const {
+  const bool slow = perByte_.count() != 0;
+  for (size_t at = 0; at < text.size();) {
+    const ssize_t count = send(fd, text.data() + at, slow ? 1 : text.size() - at, MSG_NOSIGNAL);
+    if (count <= 0) return false;
+    at += static_cast<size_t>(count);
+    if (slow) wait(perByte_);
+  }
+  return true;
 }
 
 std::string httpAnswer(int status, const std::string &body) {

@@ -20,10 +20,13 @@ struct FakeRequest {
 // after the other on each connection, connections at the same time.
 class FakeServer {
  public:
-  // What goes back over the connection, byte for byte. Nothing: the connection is closed.
+  // What goes back over the connection, byte for byte. After an empty answer, and after one that
+  // says "Connection: close", the connection is closed.
   using Answer = std::function<std::string(const FakeRequest &request)>;
 
-  explicit FakeServer(Answer answer);
+  // perByte: the pause after each byte of an answer.
+  explicit FakeServer(Answer answer,
+                      std::chrono::milliseconds perByte = std::chrono::milliseconds(0));
   FakeServer(const FakeServer &) = delete;
   FakeServer &operator=(const FakeServer &) = delete;
   ~FakeServer();
@@ -32,14 +35,16 @@ class FakeServer {
   int requests() const { return requests_; }
   int connections() const { return connections_; }
 
-  // To be called by an answer that takes its time: until then, or until the server goes.
+  // To be called by an answer that takes its time: waits so long, or until the server goes.
   void wait(std::chrono::milliseconds time) const;
 
  private:
   void serve();
   void serveConnection(UniqueFd connection);
+  bool sendAll(int fd, const std::string &text) const;
 
   Answer answer_;
+  std::chrono::milliseconds perByte_;
   std::string place_;
   UniqueFd listener_, end_;
   std::atomic<int> requests_{0}, connections_{0};

@@ -21,7 +21,7 @@ namespace {
 using Milliseconds = std::chrono::milliseconds;
 
 // A change that others keep overtaking ends at the first of these.
-constexpr int kMostAttempts = 200;
+constexpr int kMostAttempts = 100;
 constexpr Milliseconds kMostTime{10000};
 constexpr int kMostPauseMs = 50;
 
