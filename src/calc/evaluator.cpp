@@ -32,8 +32,8 @@ bool isNameStart(char c) {
 bool isNamePart(char c) {
   return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_' || c == '.';
 }
-bool startsWith(const char *text, std::string_view word) {
-  return std::strncmp(text, word.data(), word.size()) == 0;
+bool startsWith(const char *text, const char *word) {
+  return std::strncmp(text, word, std::strlen(word)) == 0;
 }
 bool isTrue(float value) {
   return value != 0.0F;
@@ -47,11 +47,30 @@ const char *skipSpace(const char *at) {
   return at;
 }
 
-[[noreturn]] void fail(const std::string &message, const char *position) {
+// What needs an object to work on, messages above all, is a function of its own: inlined, it would
+// widen the frames of the recursion, most of all with a sanitizer's red zones around the object.
+[[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
-[[noreturn]] void failExpected(std::string_view name, const char *what, const char *position) {
-  fail(std::string(name) + " expected " + what, position);
+[[noreturn, gnu::noinline]] void failExpected(const char *name, const char *what,
+                                              const char *position) {
+  throw Exception(std::string(name) + " expected " + what, position);
+}
+[[noreturn, gnu::noinline]] void failUnknown(const char *name, const char *after) {
+  throw Exception("unexpected symbol: " + std::string(name, after), name);
+}
+
+enum class Word { kNone, kMin, kMax, kCeil, kNot, kTrue, kFalse };
+
+[[gnu::noinline]] Word wordOf(const char *name, const char *after) {
+  const std::string_view text(name, static_cast<size_t>(after - name));
+  if (text == "min") return Word::kMin;
+  if (text == "max") return Word::kMax;
+  if (text == "ceil") return Word::kCeil;
+  if (text == "not") return Word::kNot;
+  if (text == "True") return Word::kTrue;
+  if (text == "False") return Word::kFalse;
+  return Word::kNone;
 }
 
 // The cursor says where reading stopped. It is a member, not a local of every level, to keep the
@@ -72,15 +91,15 @@ class Reader {
   float readParenthesis(const char *open);
   float readNumber(const char *start);
   float readNamed(const char *start);
-  float readMinMax(std::string_view name, const char *after);
-  float readCeil(std::string_view name, const char *after);
+  float readMinMax(Word word, const char *after);
+  float readCeil(const char *after);
   float readNot(const char *after);
   float readChain(float value);
   float readAnd(const char *word, float value);
   float readOr(const char *word, float value);
   float readIf(const char *word, float value);
 
-  const float *findVariable(std::string_view name) const;
+  const float *findVariable(const char *name, const char *after) const;
   void enterLevel(const char *place);
   void takeOperator(const char *place);
 
@@ -174,27 +193,38 @@ float Reader::readNumber(const char *start) {
 float Reader::readNamed(const char *start) {
   const char *after = start;
   while (isNamePart(*after)) ++after;
-  const std::string_view name(start, static_cast<size_t>(after - start));
-  if (const float *variable = findVariable(name)) {
+  if (const float *variable = findVariable(start, after)) {
     cursor_ = after;
     return *variable;
   }
-  if (name == "min" || name == "max") return readMinMax(name, after);
-  if (name == "ceil") return readCeil(name, after);
-  if (name == "not") return readNot(after);
-  // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
-  if (name == "True") return 1.0F;
-  if (name == "False") return 0.0F;
-  fail("unexpected symbol: " + std::string(name), start);
+  const Word word = wordOf(start, after);
+  switch (word) {
+    case Word::kMin:
+    case Word::kMax:
+      return readMinMax(word, after);
+    case Word::kCeil:
+      return readCeil(after);
+    case Word::kNot:
+      return readNot(after);
+    // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
+    case Word::kTrue:
+      return 1.0F;
+    case Word::kFalse:
+      return 0.0F;
+    case Word::kNone:
+      break;
+  }
+  failUnknown(start, after);
 }
 
-const float *Reader::findVariable(std::string_view name) const {
-  const auto found = variables_.find(std::string(name));
+[[gnu::noinline]] const float *Reader::findVariable(const char *name, const char *after) const {
+  const auto found = variables_.find(std::string(name, after));
   return found == variables_.end() ? nullptr : &found->second;
 }
 
 // On a tie, or with a NaN, the first argument wins.
-float Reader::readMinMax(std::string_view name, const char *after) {
+float Reader::readMinMax(Word word, const char *after) {
+  const char *const name = word == Word::kMin ? "min" : "max";
   const char *const open = skipSpace(after);
   if (*open != '(') failExpected(name, "(", open);
   cursor_ = open;
@@ -203,16 +233,16 @@ float Reader::readMinMax(std::string_view name, const char *after) {
   const float b = ParseExpression(skipSpace(cursor_ + 1), 0.0F);
   if (*cursor_ != ')') failExpected(name, ")", cursor_);
   ++cursor_;
-  const bool second = name == "min" ? b < a : b > a;
+  const bool second = word == Word::kMin ? b < a : b > a;
   return second ? b : a;
 }
 
-float Reader::readCeil(std::string_view name, const char *after) {
+float Reader::readCeil(const char *after) {
   const char *const open = skipSpace(after);
-  if (*open != '(') failExpected(name, "(", open);
+  if (*open != '(') failExpected("ceil", "(", open);
   cursor_ = open;
   const float value = std::ceil(ParseExpression(skipSpace(open + 1), 0.0F));
-  if (*cursor_ != ')') failExpected(name, ")", cursor_);
+  if (*cursor_ != ')') failExpected("ceil", ")", cursor_);
   ++cursor_;
   return value;
 }
@@ -223,7 +253,8 @@ float Reader::readNot(const char *after) {
 }
 
 // chain := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
-// No check is made that a word ends there: `3order` reads as 3 or der.
+// No check is made that a word ends there: `3order` reads as 3 or der. The tail belongs to the
+// word's level: in `1 and 1 * 1 and 1 * ...` each word stands inside the tail of the one before.
 float Reader::readChain(float value) {
   const char *const word = skipSpace(cursor_);
   if (startsWith(word, "and")) return readAnd(word, value);
@@ -237,16 +268,18 @@ float Reader::readAnd(const char *word, float value) {
   takeOperator(word);
   enterLevel(word);
   const float right = ParseOperand(skipSpace(word + 3));
+  const float all = ParseTail(truth(isTrue(value) && isTrue(right)));
   --level_;
-  return ParseTail(truth(isTrue(value) && isTrue(right)));
+  return all;
 }
 
 float Reader::readOr(const char *word, float value) {
   takeOperator(word);
   enterLevel(word);
   const float right = ParseOperand(skipSpace(word + 2));
+  const float all = ParseTail(truth(isTrue(value) || isTrue(right)));
   --level_;
-  return ParseTail(truth(isTrue(value) || isTrue(right)));
+  return all;
 }
 
 float Reader::readIf(const char *word, float value) {
@@ -255,8 +288,9 @@ float Reader::readIf(const char *word, float value) {
   const float condition = ParseOperand(skipSpace(word + 2));
   const char *const next = skipSpace(cursor_);
   const float alternative = startsWith(next, "else") ? ParseOperand(skipSpace(next + 4)) : 0.0F;
+  const float all = ParseTail(isTrue(condition) ? value : alternative);
   --level_;
-  return ParseTail(isTrue(condition) ? value : alternative);
+  return all;
 }
 
 }  // namespace
