@@ -26,8 +26,8 @@ const std::vector<std::string> kNewKey = {"-newkey", "ec", "-pkeyopt",
                                           "ec_paramgen_curve:prime256v1", "-nodes"};
 
 void request(const fs::path &folder, const std::string &name, std::vector<std::string> more) {
-  std::vector<std::string> arguments = {"req",         "-config", "openssl.cnf", "-subj",
-                                        "/CN=" + name, "-keyout", name + ".key"};
+  std::vector<std::string> arguments = {"req",        "-config", "openssl.cnf", "-subj",
+                                        "/O=" + name, "-keyout", name + ".key"};
   arguments.insert(arguments.end(), kNewKey.begin(), kNewKey.end());
   arguments.insert(arguments.end(), more.begin(), more.end());
   openssl(folder, arguments);
@@ -45,7 +45,7 @@ Authority::Authority(const fs::path &folder, const std::string &name) : folder_(
             "[own]\ndatabase = index.txt\nserial = serial\nnew_certs_dir = .\n"
             "certificate = ca.crt\nprivate_key = authority.key\ndefault_md = sha256\n"
             "policy = anything\nunique_subject = no\nrand_serial = yes\n"
-            "[anything]\ncommonName = supplied\n"
+            "[anything]\norganizationName = supplied\n"
             "[authority]\nbasicConstraints = critical,CA:TRUE\nsubjectKeyIdentifier = hash\n"
             "keyUsage = critical,keyCertSign,cRLSign\n");
   request(folder_, "authority",

@@ -20,7 +20,8 @@ class Authority {
 
   enum class Validity { kNow, kOver };
 
-  // address: the IP address that the certificate is for.
+  // address: the IP address that the certificate is for. It has no common name: a server with users
+  // takes no such client over HTTP.
   Certificate issue(const std::string &name, const std::string &address,
                     Validity validity = Validity::kNow) const;
 

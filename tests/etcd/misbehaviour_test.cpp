@@ -206,6 +206,16 @@ TEST_F(EtcdMisbehaviour, AMemberThatNeverCatchesUpIsPassedOver) {
   EXPECT_LE(server.requests(), 101);
 }
 
+TEST_F(EtcdMisbehaviour, AClientCertificateThatAServerWithUsersCannotTakeIsNamedAsTheReason) {
+  const FakeServer server([](const FakeRequest &) {
+    return httpAnswer(400,
+                      "CommonName of client sending a request against gateway will be ignored and "
+                      "not used as expected\n");
+  });
+  EXPECT_THAT(refusalOf([&] { store({&server})->read(a_); }),
+              HasSubstr("no client certificate with a common name"));
+}
+
 TEST_F(EtcdMisbehaviour, ARefusalIsNoReasonToAskTheNextMember) {
   const FakeServer server(
       [&](const FakeRequest &) { return refusalAnswer(403, 7, "etcdserver: permission denied"); });

@@ -1,5 +1,5 @@
-// The built programs on a fleet's store: poolctl takes its values from it, kestrelctl writes it, and
-// a host on SQLite knows nothing of it.
+// The built programs on a fleet's store: poolctl takes its values from it, kestrelctl writes it,
+// and a host on SQLite knows nothing of it.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 
@@ -91,9 +91,9 @@ TEST_F(EtcdPrograms, WhereTheStoreHasNoNumberTheDefaultHolds) {
   put("host/pools/a", R"({"text": "7", "truth": true})");
   put("host/pools/bad", R"({"sizeMB": 7, "nested": {}})");
   put("host/pools/garbage", "sizeMB=7");
-  for (const auto &[key, field] : {std::pair("a", "text"), std::pair("a", "truth"),
-                                   std::pair("a", "none"), std::pair("none", "sizeMB"),
-                                   std::pair("bad", "sizeMB"), std::pair("garbage", "sizeMB")}) {
+  for (const auto &[key, field] :
+       {std::pair("a", "text"), std::pair("a", "truth"), std::pair("a", "none"),
+        std::pair("none", "sizeMB"), std::pair("bad", "sizeMB"), std::pair("garbage", "sizeMB")}) {
     EXPECT_EQ(list("- {name: a, memMax: " + reference(key, field, "5") + "}\n"),
               "host/opt/a,yes,0,5,-,-,0,-,1000\n")
         << key << " " << field;
@@ -207,8 +207,7 @@ TEST_F(EtcdPrograms, KestrelctlSetsShowsAndDeletes) {
   kestrelctl({"set", "host", "a/b %", "", "r", "7.0"});
   kestrelctl({"set", "host", "a/b %", "", "t", "7", "--type", "text"});
   kestrelctl({"set", "host", "a/b %", "", "t", "true", "--extra", "\xc3\xa9"});
-  EXPECT_EQ(kestrelctl({"get", "host", "a/b %", ""}),
-            "n\tinteger\t7\nr\treal\t7.0\nt\ttext\t7\n");
+  EXPECT_EQ(kestrelctl({"get", "host", "a/b %", ""}), "n\tinteger\t7\nr\treal\t7.0\nt\ttext\t7\n");
   EXPECT_EQ(kestrelctl({"get", "host", "a/b %", "", "r"}), "7.0\n");
   EXPECT_EQ(lines(kestrelctl({"list"})).size(), 4U);
   kestrelctl({"delete", "host", "a/b %", "", "n"});
@@ -275,8 +274,8 @@ TEST_F(EtcdPrograms, EveryKeyOfTheConfigurationIsFollowedAndThePasswordNeverShow
   EXPECT_EQ(kestrelctl({"get", "host", "pools", "a", "sizeMB"}), "7\n");
   EXPECT_THAT(kestrelctl({"status"}), Not(HasSubstr("hunter22")));
   writeFile(password, "hunter33\n");
-  EXPECT_THAT(kestrelctl({"status"}, 1), AllOf(HasSubstr("authentication failed"),
-                                               Not(HasSubstr("hunter"))));
+  EXPECT_THAT(kestrelctl({"status"}, 1),
+              AllOf(HasSubstr("authentication failed"), Not(HasSubstr("hunter"))));
 }
 
 }  // namespace

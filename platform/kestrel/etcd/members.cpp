@@ -6,6 +6,7 @@
 #include <array>
 #include <cstdio>
 #include <stdexcept>
+#include <string_view>
 #include <thread>
 
 #include "kestrel/errors.h"
@@ -30,11 +31,18 @@ class MemberFailure : public std::runtime_error {
   const bool mayHaveActed;
 };
 
+// etcd itself says this as a plain text, before anything else has looked at the request.
+constexpr std::string_view kCommonName = "CommonName of client";
+
 Refusal refusalOf(const HttpAnswer &answer) {
   try {
     if (auto refusal = readRefusal(answer.body)) return std::move(*refusal);
   } catch (const ProtocolError &) {
     // As good as any other text.
+  }
+  if (answer.body.compare(0, kCommonName.size(), kCommonName) == 0) {
+    throw MemberFailure("it has users, and then takes no client certificate with a common name",
+                        false);
   }
   throw MemberFailure("HTTP status " + std::to_string(answer.status) + ", and no word of etcd's",
                       true);
