@@ -34,6 +34,7 @@ class EtcdMember {
 
   const std::string &url() const { return url_; }
   bool running() const { return pid_ > 0; }
+  pid_t pid() const { return pid_; }
 
   void start();
   void kill();    // at once, and it is gone when this returns
