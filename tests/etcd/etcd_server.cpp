@@ -163,8 +163,9 @@ void Etcd::awaitReady(size_t index) {
   Kestrel::Etcd::HttpClient client{Kestrel::Configuration()};
   const auto end = std::chrono::steady_clock::now() + kMostStart;
   while (std::chrono::steady_clock::now() < end) {
-    const auto answer = client.post(member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
-                                    std::chrono::seconds(5), size_t{1} << 16);
+    const auto answer =
+        client.post(member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
+                    {std::chrono::seconds(5), std::chrono::seconds(5)}, size_t{1} << 16);
     if (answer.status == 200 || answer.status == kBadRequest) return;
     std::this_thread::sleep_for(kStep);
   }

@@ -239,6 +239,16 @@ TEST_F(EtcdMisbehaviour, AChangeWhoseAnswerIsLostIsNotMadeTwice) {
   EXPECT_EQ(second.requests(), 0);
 }
 
+TEST_F(EtcdMisbehaviour, AMemberThatHasGotAChangeHasAllTheTimeThereIs) {
+  FakeServer *self = nullptr;
+  FakeServer slow([&](const FakeRequest &) {
+    self->wait(milliseconds(600));
+    return httpAnswer(200, R"({"header":{"cluster_id":"1","revision":"8"},"deleted":"1"})");
+  });
+  self = &slow;
+  EXPECT_TRUE(store({&slow, &good_, &good_}, milliseconds(1500))->removeObject(a_));
+}
+
 TEST_F(EtcdMisbehaviour, AChangeThatNeverReachedAMemberGoesToTheNext) {
   const FakeServer server([](const FakeRequest &request) {
     return request.path == "/v3/kv/deleterange"

@@ -3,6 +3,8 @@
 // has not changed meanwhile.
 #include "kestrel/etcd/etcd_backend.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <map>
 #include <random>
@@ -41,13 +43,6 @@ std::string valueOf(const std::string &key, const Fields &fields) {
   } catch (const ValueError &error) {
     throw storeError("etcd", key, error.what());
   }
-}
-
-// Writers that met once should not meet again.
-void pauseAfter(int attempt) {
-  static std::minstd_rand random(std::random_device{}());
-  const int most = std::min(1 << std::min(attempt, 10), kMostPauseMs);
-  std::this_thread::sleep_for(Milliseconds(std::uniform_int_distribution<int>(0, most)(random)));
 }
 
 bool before(const StoredObject &a, const StoredObject &b) {
@@ -232,8 +227,14 @@ class EtcdBackend : public Backend {
         throw storeError("etcd", key, "others keep changing it; nothing was changed");
       }
       found = std::move(answer.found);
-      pauseAfter(attempt);
+      std::this_thread::sleep_for(pauseAfter(attempt));
     }
+  }
+
+  // Writers that met once should not meet again.
+  Milliseconds pauseAfter(int attempt) {
+    const int most = std::min(1 << std::min(attempt, 10), kMostPauseMs);
+    return Milliseconds(std::uniform_int_distribution<int>(0, most)(random_));
   }
 
   ChangeAnswer send(const ChangeRequest &request) {
@@ -250,6 +251,9 @@ class EtcdBackend : public Backend {
   Members members_;
   std::string cluster_;   // empty: none has answered yet
   int64_t revision_ = 0;  // 0: likewise
+  std::minstd_rand random_{
+      static_cast<unsigned>(getpid()) ^
+      static_cast<unsigned>(Deadline::Clock::now().time_since_epoch().count())};
 };
 
 }  // namespace

@@ -40,6 +40,11 @@ void startLibrary() {
   if (result != CURLE_OK) throw storeError("etcd", "libcurl", curl_easy_strerror(result));
 }
 
+// 0 would mean for ever.
+long atLeastOne(std::chrono::milliseconds time) {
+  return static_cast<long>(std::max<int64_t>(time.count(), 1));
+}
+
 template <typename Value>
 void set(CURL *handle, CURLoption option, Value value) {
   const CURLcode result = curl_easy_setopt(handle, option, value);
@@ -118,16 +123,15 @@ void HttpClient::setHeaders(const std::string &token) {
 }
 
 HttpAnswer HttpClient::post(const std::string &url, const std::string &json,
-                            const std::string &token, std::chrono::milliseconds time,
-                            size_t mostBytes) {
+                            const std::string &token, TimeLimits limits, size_t mostBytes) {
   CURL *handle = handle_.get();
   if (token != token_) setHeaders(token);
   Sink sink{{}, mostBytes};
   set(handle, CURLOPT_URL, url.c_str());
   set(handle, CURLOPT_POSTFIELDS, json.c_str());
   set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(json.size()));
-  // 0 would mean for ever.
-  set(handle, CURLOPT_TIMEOUT_MS, static_cast<long>(std::max<int64_t>(time.count(), 1)));
+  set(handle, CURLOPT_CONNECTTIMEOUT_MS, atLeastOne(limits.connect));
+  set(handle, CURLOPT_TIMEOUT_MS, atLeastOne(limits.whole));
   set(handle, CURLOPT_WRITEDATA, static_cast<void *>(&sink));
   errorText_[0] = '\0';
 

@@ -28,6 +28,11 @@ struct HttpAnswer {
   std::string problem;  // why there is no answer, in words
 };
 
+// How long an exchange may take: until there is a connection, and in all.
+struct TimeLimits {
+  std::chrono::milliseconds connect, whole;
+};
+
 // Not for two threads at once.
 class HttpClient {
  public:
@@ -35,10 +40,10 @@ class HttpClient {
   // cannot be used.
   explicit HttpClient(const Configuration &configuration);
 
-  // Sends a JSON text and waits at most TIME for the whole answer. token: for the Authorization
-  // header; empty: none. mostBytes: the largest body that is taken.
+  // Sends a JSON text and waits for the whole answer. token: for the Authorization header; empty:
+  // none. mostBytes: the largest body that is taken.
   HttpAnswer post(const std::string &url, const std::string &json, const std::string &token,
-                  std::chrono::milliseconds time, size_t mostBytes);
+                  TimeLimits limits, size_t mostBytes);
 
  private:
   struct HandleDeleter {

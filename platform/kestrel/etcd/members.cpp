@@ -81,8 +81,8 @@ void Members::ask(const Request &request, const Read &read) {
   for (auto left = usable(); !left.empty(); left = usable()) {
     Member &member = *left.front();
     try {
-      return attempt(member, request, read,
-                     Deadline(whole.left() / static_cast<int64_t>(left.size())));
+      const Deadline part(whole.left() / static_cast<int64_t>(left.size()));
+      return attempt(member, request, read, part, whole);
     } catch (const MemberFailure &failure) {
       member.failure = failure.what();
       if (request.kind == Request::Kind::kChange && failure.mayHaveActed) {
@@ -103,12 +103,13 @@ std::vector<Members::Member *> Members::usable() {
 }
 
 void Members::attempt(const Member &member, const Request &request, const Read &read,
-                      const Deadline &deadline) {
+                      const Deadline &part, const Deadline &whole) {
   const bool change = request.kind == Request::Kind::kChange;
   bool renewed = false;
   for (int pauses = 0;;) {
-    if (!token_) authenticate(member, deadline);
-    const HttpAnswer answer = send(member, request, deadline);
+    if (!token_) authenticate(member, part);
+    const HttpAnswer answer =
+        send(member, request, {part.left(), change ? whole.left() : part.left()});
     if (answer.status == 200) return readOrFail(read, answer.body);
 
     const Refusal refusal = refusalOf(answer);
@@ -117,10 +118,10 @@ void Members::attempt(const Member &member, const Request &request, const Read &
         renewToken(member, request, refusal, &renewed);
         continue;
       case Meaning::kBehind:
-        if (++pauses > kMostPauses || deadline.passed()) {
+        if (++pauses > kMostPauses || part.passed()) {
           throw MemberFailure("it lags behind: " + refusal.message, false);
         }
-        std::this_thread::sleep_for(std::min(kPause, deadline.left()));
+        std::this_thread::sleep_for(std::min(kPause, part.left()));
         continue;
       case Meaning::kMember:
         throw MemberFailure(refusal.message, true);
@@ -134,9 +135,9 @@ void Members::attempt(const Member &member, const Request &request, const Read &
   }
 }
 
-HttpAnswer Members::send(const Member &member, const Request &request, const Deadline &deadline) {
+HttpAnswer Members::send(const Member &member, const Request &request, TimeLimits limits) {
   HttpAnswer answer = http_.post(member.url + request.path, request.json, token_.value_or(""),
-                                 deadline.left(), kMostAnswerBytes);
+                                 limits, kMostAnswerBytes);
   if (answer.end == HttpAnswer::End::kAnswered) return answer;
   if (answer.end == HttpAnswer::End::kTooLarge && request.kind == Request::Kind::kPage) {
     throw RequestRefused(RequestRefused::Why::kTooLargeAnswer,
@@ -145,7 +146,7 @@ HttpAnswer Members::send(const Member &member, const Request &request, const Dea
   throw MemberFailure(answer.problem, answer.end != HttpAnswer::End::kNotReached);
 }
 
-void Members::authenticate(const Member &member, const Deadline &deadline) {
+void Members::authenticate(const Member &member, const Deadline &part) {
   const std::string subject = "user \"" + user_ + "\"";
   const std::string password = readPassword(passwordFile_);
   const Request request{Request::Kind::kRead, kAuthenticatePath, authenticateText(user_, password),
@@ -153,7 +154,7 @@ void Members::authenticate(const Member &member, const Deadline &deadline) {
   token_ = "";
   const HttpAnswer answer = [&] {
     try {
-      return send(member, request, deadline);
+      return send(member, request, {part.left(), part.left()});
     } catch (...) {
       token_.reset();
       throw;
@@ -204,7 +205,7 @@ std::string Members::failures() const {
 std::string Members::condition(const std::string &endpoint) {
   const auto start = Deadline::Clock::now();
   const HttpAnswer answer =
-      http_.post(endpoint + kStatusPath, "{}", "", timeout_, kMostAnswerBytes);
+      http_.post(endpoint + kStatusPath, "{}", "", {timeout_, timeout_}, kMostAnswerBytes);
   const auto time = Deadline::Clock::now() - start;
   if (answer.end != HttpAnswer::End::kAnswered) return "does not answer: " + answer.problem;
   try {

@@ -52,9 +52,10 @@ class Members {
   // Asks no server. Throws a ConfigStoreException when the settings cannot be used.
   explicit Members(const Configuration &configuration);
 
-  // Sends a request to one member after the other until one answers, within timeout-ms in all; each
-  // has an equal part of what is left. read: takes the answer; where it throws ProtocolError, the
-  // member has failed. Throws RequestRefused, or another ConfigStoreException when none answers.
+  // Sends a request to one member after the other until one answers, within timeout-ms in all. Each
+  // has an equal part of what is left; one that has got a change has all of it, for nobody is asked
+  // after it. read: takes the answer; where it throws ProtocolError, the member has failed. Throws
+  // RequestRefused, or another ConfigStoreException when none answers.
   using Read = std::function<void(const std::string &json)>;
   void ask(const Request &request, const Read &read);
 
@@ -73,10 +74,10 @@ class Members {
   };
 
   std::vector<Member *> usable();
-  void attempt(const Member &member, const Request &request, const Read &read,
-               const Deadline &deadline);
-  HttpAnswer send(const Member &member, const Request &request, const Deadline &deadline);
-  void authenticate(const Member &member, const Deadline &deadline);
+  void attempt(const Member &member, const Request &request, const Read &read, const Deadline &part,
+               const Deadline &whole);
+  HttpAnswer send(const Member &member, const Request &request, TimeLimits limits);
+  void authenticate(const Member &member, const Deadline &part);
   void renewToken(const Member &member, const Request &request, const Refusal &refusal,
                   bool *renewed);
   [[noreturn]] void giveUpAndThrow(const std::string &subject, const std::string &why);
