@@ -109,6 +109,7 @@ class EtcdBackend : public Backend {
       values[key] = valueOf(key, object.fields);
     }
     std::vector<KeyValue> pairs;
+    pairs.reserve(values.size());
     for (auto &[key, value] : values) pairs.push_back({key, std::move(value), 0});
     const std::string subject = std::to_string(pairs.size()) + " objects in one transaction";
     members_.ask({Request::Kind::kChange, kTransactionPath, putAllText(pairs), subject},
