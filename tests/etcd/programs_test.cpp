@@ -37,6 +37,12 @@ std::string poolsWithReferences(int count) {
 
 class EtcdPrograms : public testing::Test {
  protected:
+  // A sanitizer loads modules in the name of its own library, which has no path to ours.
+  EtcdPrograms() {
+    const std::string folder = SANITIZED_LIBRARIES;
+    if (!folder.empty()) world_.environment["LD_LIBRARY_PATH"] = folder;
+  }
+
   void serve(int members = 1, const std::string &timeout = "20000") {
     etcd_ = std::make_unique<Etcd>(world_.folder(), members);
     std::string list;
