@@ -1,0 +1,60 @@
+// Looks one field up as any program does, through libkestrelconfig alone, and prints what came back
+// or which exception did; after that, what the process has mapped.
+//
+// usage: store_probe COMPONENT GROUP KEY FIELD
+#include <exception>
+#include <fstream>
+#include <iostream>
+#include <string>
+
+#include "platform/kestrel_config_store.h"
+
+namespace {
+
+using KestrelConfigStore::ConfigStore;
+using KestrelConfigStore::ConfigStoreException;
+using KestrelConfigStore::ConfigStoreObjectId;
+using KestrelConfigStore::InvalidTypeException;
+using KestrelConfigStore::sGlobalNamespace;
+
+void lookUp(const ConfigStoreObjectId &id, const char *field) {
+  const auto store = ConfigStore::GetStore(sGlobalNamespace);
+  if (!store) {
+    std::cout << "no store\n";
+    return;
+  }
+  const auto object = store->GetObject(id);
+  if (!object) {
+    std::cout << "no object\n";
+    return;
+  }
+  long integer = 0;
+  double real = 0;
+  try {
+    if (!object->GetValue(field, &integer)) {
+      std::cout << "no field\n";
+    } else {
+      std::cout << "integer " << integer << '\n';
+    }
+  } catch (const InvalidTypeException &) {
+    if (object->GetValue(field, &real)) std::cout << "real " << real << '\n';
+  }
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+  if (argc != 5) return 2;
+  const ConfigStoreObjectId id{argv[3], argv[1], argv[2], ""};
+  try {
+    lookUp(id, argv[4]);
+  } catch (const InvalidTypeException &error) {
+    std::cout << "InvalidTypeException: " << error.what() << '\n';
+  } catch (const ConfigStoreException &error) {
+    std::cout << "ConfigStoreException: " << error.what() << '\n';
+  } catch (const std::exception &error) {
+    std::cout << "std::exception: " << error.what() << '\n';
+  }
+  std::cout << std::ifstream("/proc/self/maps").rdbuf();
+  return 0;
+}
