@@ -12,9 +12,12 @@ foreach(name knob kestrelconfig)
     list(APPEND libraries ${name})
   endif()
 endforeach()
+# The build tree has the same shape and uses the same path: with two different ones CMake pads the
+# first with an empty entry, which makes the loader look for libraries in the current folder.
 if(NOT CMAKE_INSTALL_PREFIX STREQUAL "/usr")
-  set_target_properties(${programs} ${libraries}
-                        PROPERTIES INSTALL_RPATH "$ORIGIN/../${CMAKE_INSTALL_LIBDIR}")
+  set_target_properties(${programs} PROPERTIES
+    BUILD_WITH_INSTALL_RPATH ON INSTALL_RPATH "$ORIGIN/../lib" INSTALL_RPATH_USE_LINK_PATH ON)
+  set(CMAKE_INSTALL_LIBDIR lib)
 endif()
 install(TARGETS ${programs}
         RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT programs)

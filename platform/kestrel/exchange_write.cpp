@@ -102,6 +102,14 @@ std::string writtenValue(const Value &value) {
   return printed[0] == '-' ? "-." + printed.substr(1) : "." + printed;
 }
 
+// "name: value"; YAML wants a mark before a key that is longer than it looks ahead for a colon.
+std::string writtenField(const std::string &name, const Value &value) {
+  constexpr size_t kLongestSimpleKey = 1000;
+  const std::string key = writtenName(name);
+  if (key.size() <= kLongestSimpleKey) return "    " + key + ": " + writtenValue(value) + "\n";
+  return "    ? " + key + "\n    : " + writtenValue(value) + "\n";
+}
+
 void writeObject(const StoredObject &object, std::string *text) {
   checkId(object.id);
   *text += "- component: " + writtenName(object.id.component) + "\n";
@@ -111,7 +119,7 @@ void writeObject(const StoredObject &object, std::string *text) {
   *text += object.fields.empty() ? "  fields: {}\n" : "  fields:\n";
   for (const auto &[name, value] : object.fields) {
     checkFieldName(name);
-    *text += "    " + writtenName(name) + ": " + writtenValue(value) + "\n";
+    *text += writtenField(name, value);
   }
 }
 

@@ -10,6 +10,7 @@
 #include "kestrel/object_names.h"
 #include "kestrel/open.h"
 #include "kestrelctl/exchange_files.h"
+#include "shared/command_table.h"
 #include "shared/text.h"
 
 namespace Kestrelctl {
@@ -149,8 +150,6 @@ ExitStatus status(const Words &) {
   throw Failure(Tools::kExitFailure, report.problem);
 }
 
-using Declare = void (*)(CLI::App &command, Words *words);
-
 void idWords(CLI::App &command, Words *words) {
   command.add_option("COMPONENT", words->id.component, "First part of the object's name")
       ->required();
@@ -193,14 +192,7 @@ void importWords(CLI::App &command, Words *words) {
 
 void noWords(CLI::App &, Words *) {}
 
-struct Command {
-  const char *name;
-  const char *help;
-  Declare declare;
-  ExitStatus (*run)(const Words &words);
-};
-
-constexpr std::array<Command, 7> kCommands = {{
+constexpr std::array<Tools::Command<Words>, 7> kCommands = {{
     {"set", "Writes one field of an object", setWords, set},
     {"get", "Prints a field's value, or all fields of an object", fieldWords, get},
     {"delete", "Deletes a field, or a whole object", fieldWords, remove},
@@ -213,14 +205,7 @@ constexpr std::array<Command, 7> kCommands = {{
 }  // namespace
 
 void addCommands(CLI::App &app, Tools::Action *action) {
-  app.require_subcommand(0, 1);
-  for (const Command &row : kCommands) {
-    CLI::App *command = app.add_subcommand(row.name, row.help);
-    const auto words = std::make_shared<Words>();
-    row.declare(*command, words.get());
-    command->callback(
-        [action, words, run = row.run] { *action = [words, run] { return run(*words); }; });
-  }
+  Tools::addCommands(app, kCommands, action);
 }
 
 }  // namespace Kestrelctl

@@ -8,6 +8,7 @@
 #include <fstream>
 #include <iostream>
 #include <memory>
+#include <unordered_set>
 
 #include "model.h"
 #include "platform/knob.h"
@@ -50,6 +51,7 @@ constexpr const char *kNodeNames[] = {"hardware_cpu_cpuInfo",
 struct State {
   Recording::Model model;
   std::vector<std::unique_ptr<KNOB_ParamList>> lists;
+  std::unordered_set<const KNOB_ParamList *> known;
   int signatureChecks = 0;
 };
 
@@ -106,13 +108,12 @@ uint32_t injected(const char *function, const std::string &node = {},
 }
 
 bool isUsable(const KNOB_ParamList *list, const char *function) {
-  for (const auto &known : state().lists) {
-    if (known.get() != list) continue;
-    if (!list->destroyed) return true;
-    write(formatted("MISUSE %s of the destroyed list #%d", function, list->number));
+  if (state().known.count(list) == 0) {
+    write(formatted("MISUSE %s of an unknown list", function));
     return false;
   }
-  write(formatted("MISUSE %s of an unknown list", function));
+  if (!list->destroyed) return true;
+  write(formatted("MISUSE %s of the destroyed list #%d", function, list->number));
   return false;
 }
 
@@ -128,6 +129,7 @@ KNOB_ParamList *newList(int kind, int capacity) {
   list->number = static_cast<int>(state().lists.size()) + 1;
   list->kind = kind;
   list->capacity = capacity;
+  state().known.insert(list.get());
   state().lists.push_back(std::move(list));
   return state().lists.back().get();
 }

@@ -1,0 +1,38 @@
+// One table from a kernel's status to a tool's exit status.
+#include "knobctl/kernel_access.h"
+
+#include "knob/status.h"
+#include "shared/text.h"
+
+namespace Knobctl {
+
+namespace {
+
+Tools::ExitStatus exitStatus(Knob::Status status) {
+  switch (status) {
+    case Knob::Status::kNotFound:
+      return Tools::kExitNotFound;
+    case Knob::Status::kBusy:
+    case Knob::Status::kMemoryBusy:
+      return Tools::kExitBusy;
+    default:
+      return Tools::kExitFailure;
+  }
+}
+
+// The status's own text sends people to knobctl; here the reason itself is at hand.
+std::string statusWords(Knob::Status status) {
+  if (status == Knob::Status::kKernelNotUsable) return "kernel not usable";
+  return Knob::statusText(static_cast<uint32_t>(status));
+}
+
+}  // namespace
+
+Tools::Failure failure(const std::string &what, const Knob::KernelError &error) {
+  std::string text = Tools::printable(what) + ": " + statusWords(error.status);
+  const std::string detail = error.what();
+  if (!detail.empty()) text += ": " + Tools::printable(detail);
+  return {exitStatus(error.status), text};
+}
+
+}  // namespace Knobctl

@@ -1,0 +1,25 @@
+// Starting the emulated kernel: the only kernel that a tool can boot.
+#pragma once
+
+#include <CLI/App.hpp>
+#include <optional>
+#include <string>
+
+namespace Knobctl {
+
+// What is not given is this machine's own.
+struct BootWords {
+  std::optional<uint32_t> cpus, maxVms;
+  std::optional<uint64_t> memoryMB;
+  bool vm = false;
+  std::string commandLine;
+  bool hasCommandLine = false;
+  bool force = false;
+};
+
+void declareBootWords(CLI::App &command, BootWords *words);
+
+// Throws Failure: busy, when the running kernel has groups and force is not given.
+void bootKernel(const BootWords &words);
+
+}  // namespace Knobctl
