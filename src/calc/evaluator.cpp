@@ -47,11 +47,17 @@ const char *skipSpace(const char *at) {
   return at;
 }
 
-[[noreturn]] void fail(const std::string &message, const char *position) {
+// Messages are made in functions of their own: inlined, their texts would widen the frames of the
+// recursion, most of all with a sanitizer's red zones around them.
+[[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
-[[noreturn]] void failExpected(std::string_view name, const char *what, const char *position) {
-  fail(std::string(name) + " expected " + what, position);
+[[noreturn, gnu::noinline]] void failExpected(std::string_view name, const char *what,
+                                              const char *position) {
+  throw Exception(std::string(name) + " expected " + what, position);
+}
+[[noreturn, gnu::noinline]] void failUnknown(std::string_view name, const char *position) {
+  throw Exception("unexpected symbol: " + std::string(name), position);
 }
 
 // The cursor says where reading stopped. It is a member, not a local of every level, to keep the
@@ -80,7 +86,7 @@ class Reader {
   float readOr(const char *word, float value);
   float readIf(const char *word, float value);
 
-  const float *findVariable(std::string_view name) const;
+  [[gnu::noinline]] const float *findVariable(std::string_view name) const;
   void enterLevel(const char *place);
   void takeOperator(const char *place);
 
@@ -185,7 +191,7 @@ float Reader::readNamed(const char *start) {
   // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
   if (name == "True") return 1.0F;
   if (name == "False") return 0.0F;
-  fail("unexpected symbol: " + std::string(name), start);
+  failUnknown(name, start);
 }
 
 const float *Reader::findVariable(std::string_view name) const {
@@ -223,7 +229,8 @@ float Reader::readNot(const char *after) {
 }
 
 // chain := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
-// No check is made that a word ends there: `3order` reads as 3 or der.
+// No check is made that a word ends there: `3order` reads as 3 or der. The tail belongs to the
+// word's level: in `1 and 1 * 1 and 1 * ...` each word stands inside the tail of the one before.
 float Reader::readChain(float value) {
   const char *const word = skipSpace(cursor_);
   if (startsWith(word, "and")) return readAnd(word, value);
@@ -237,16 +244,18 @@ float Reader::readAnd(const char *word, float value) {
   takeOperator(word);
   enterLevel(word);
   const float right = ParseOperand(skipSpace(word + 3));
+  const float all = ParseTail(truth(isTrue(value) && isTrue(right)));
   --level_;
-  return ParseTail(truth(isTrue(value) && isTrue(right)));
+  return all;
 }
 
 float Reader::readOr(const char *word, float value) {
   takeOperator(word);
   enterLevel(word);
   const float right = ParseOperand(skipSpace(word + 2));
+  const float all = ParseTail(truth(isTrue(value) || isTrue(right)));
   --level_;
-  return ParseTail(truth(isTrue(value) || isTrue(right)));
+  return all;
 }
 
 float Reader::readIf(const char *word, float value) {
@@ -255,8 +264,9 @@ float Reader::readIf(const char *word, float value) {
   const float condition = ParseOperand(skipSpace(word + 2));
   const char *const next = skipSpace(cursor_);
   const float alternative = startsWith(next, "else") ? ParseOperand(skipSpace(next + 4)) : 0.0F;
+  const float all = ParseTail(isTrue(condition) ? value : alternative);
   --level_;
-  return ParseTail(isTrue(condition) ? value : alternative);
+  return all;
 }
 
 }  // namespace

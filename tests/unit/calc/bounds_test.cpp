@@ -39,6 +39,11 @@ const Nesting kNestings[] = {
     {"Or", "1 or ", "1", ""},
     {"If", "1 if ", "1", ""},
     {"IfElse", "1 if 1 else ", "1", ""},
+    {"AndInTheTailOfAnd", "1 and 1*", "1", ""},
+    {"OrInTheTailOfOr", "0 or 1/", "1", ""},
+    {"IfInTheTailOfIf", "1 if 1*", "1", ""},
+    {"IfInTheTailOfElse", "1 if 0 else 1*", "1", ""},
+    {"NotInAProduct", "1*not ", "1", ""},
     {"IfElseInTheCondition", "1 if ", "1", " else 1"},
     {"EveryKind", "1-(min(ceil(not 1 and 1 or 1 if 1 else ", "1", "),1))"},
 };

@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <limits>
 #include <string>
 #include <vector>
@@ -84,7 +85,7 @@ TEST(HostFacts, AreReadOnceInAProcess) {
     const Calc::VariableTable &first = Loader::hostFacts();
     knob().physicalCpus = 99;
     Loader::ResourcePoolImpl pool(yaml("{name: a, memMin: !calc numPCPUs}"));
-    EXPECT_EQ(8, pool.mem.min);
+    EXPECT_EQ(8, int64_t{pool.mem.min});
     EXPECT_EQ(&first, &Loader::hostFacts());
     EXPECT_EQ(4u, knob().calls.size());
   });
