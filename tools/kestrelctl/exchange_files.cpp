@@ -38,16 +38,17 @@ void writeAll(int fd, const std::string &file, const std::string &text) {
   }
 }
 
-UniqueFd opened(const std::string &file, int flags) {
+// file: the name that the user knows.
+UniqueFd opened(const std::string &path, int flags, const std::string &file) {
   constexpr mode_t kMode = 0666;  // what the umask leaves of it, as for every file
-  UniqueFd fd(open(file.c_str(), flags | O_WRONLY | O_CREAT | O_CLOEXEC, kMode));
+  UniqueFd fd(open(path.c_str(), flags | O_WRONLY | O_CREAT | O_CLOEXEC, kMode));
   if (!fd) throw systemFailure(file, errno);
   return fd;
 }
 
 void replaceFile(const std::string &file, const std::string &text) {
   const std::string scratch = file + ".new-" + std::to_string(getpid());
-  const UniqueFd fd = opened(scratch, O_EXCL);
+  const UniqueFd fd = opened(scratch, O_EXCL, file);
   try {
     writeAll(fd.get(), file, text);
     if (fsync(fd.get()) != 0) throw systemFailure(file, errno);
@@ -83,7 +84,7 @@ void writeExchangeFile(const std::string &file, const std::vector<Kestrel::Store
   if (file.empty() || file == "-") {
     std::cout << text;
   } else if (isSpecial(file)) {
-    writeAll(opened(file, O_TRUNC).get(), file, text);
+    writeAll(opened(file, O_TRUNC, file).get(), file, text);
   } else {
     replaceFile(file, text);
   }

@@ -182,14 +182,19 @@ void checkWords(CLI::App &command, Words *words) {
   command.add_flag("--repair", words->repair, "Mend what is wrong");
 }
 
+// The parser alone would take the largest number for one that is larger still.
+bool isProcessNumber(const std::string &text) {
+  constexpr size_t kMostDigits = 18;
+  return text.size() <= kMostDigits && text.find_first_not_of("0123456789") == std::string::npos &&
+         text.find_first_not_of('0') != std::string::npos;
+}
+
 void joinWords(CLI::App &command, Words *words) {
   pathWord(command, words);
   command.add_option("PID", words->pid, "Number of the process")
       ->required()
       ->check([](const std::string &text) {
-        const bool positive = !text.empty() && text.find_first_not_of('0') != std::string::npos &&
-                              text.find_first_not_of("0123456789") == std::string::npos;
-        return positive ? std::string() : "\"" + printable(text) + "\" is no process's number";
+        return isProcessNumber(text) ? "" : "\"" + printable(text) + "\" is no process's number";
       });
 }
 

@@ -89,11 +89,6 @@ std::string escapedBytes(std::string_view bytes) {
   return text;
 }
 
-std::string blanks(const std::string &text, size_t columns) {
-  const size_t width = displayWidth(text);
-  return std::string(columns > width ? columns - width : 0, ' ');
-}
-
 }  // namespace
 
 std::string printable(std::string_view text) {
@@ -125,11 +120,8 @@ size_t displayWidth(std::string_view text) {
 }
 
 std::string padded(const std::string &text, size_t columns) {
-  return text + blanks(text, columns);
-}
-
-std::string paddedLeft(const std::string &text, size_t columns) {
-  return blanks(text, columns) + text;
+  const size_t width = displayWidth(text);
+  return text + std::string(columns > width ? columns - width : 0, ' ');
 }
 
 }  // namespace Tools

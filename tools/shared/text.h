@@ -18,6 +18,5 @@ size_t displayWidth(std::string_view text);
 
 // The text filled up with blanks to that many columns.
 std::string padded(const std::string &text, size_t columns);
-std::string paddedLeft(const std::string &text, size_t columns);
 
 }  // namespace Tools
