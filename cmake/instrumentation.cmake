@@ -6,3 +6,7 @@ if(POOLCTL_COVERAGE)
   add_compile_options(--coverage -fprofile-update=atomic)
   add_link_options(--coverage)
 endif()
+if(POOLCTL_FUZZ)
+  # The fuzzer is led by what each input reaches.
+  add_compile_options(-fsanitize=fuzzer-no-link)
+endif()

@@ -124,7 +124,7 @@ bool Configuration::operator==(const Configuration &other) const {
 
 std::string configurationFile() {
   const char *named = secure_getenv("KESTREL_CONF");
-  return named == nullptr ? kDefaultFile : named;
+  return named == nullptr || *named == '\0' ? kDefaultFile : named;
 }
 
 Configuration readConfiguration() {

@@ -32,8 +32,8 @@ bool isNameStart(char c) {
 bool isNamePart(char c) {
   return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_' || c == '.';
 }
-bool startsWith(const char *text, std::string_view word) {
-  return std::strncmp(text, word.data(), word.size()) == 0;
+bool startsWith(const char *text, const char *word) {
+  return std::strncmp(text, word, std::strlen(word)) == 0;
 }
 bool isTrue(float value) {
   return value != 0.0F;
@@ -47,17 +47,30 @@ const char *skipSpace(const char *at) {
   return at;
 }
 
-// Messages are made in functions of their own: inlined, their texts would widen the frames of the
-// recursion, most of all with a sanitizer's red zones around them.
+// What needs an object to work on, messages above all, is a function of its own: inlined, it would
+// widen the frames of the recursion, most of all with a sanitizer's red zones around the object.
 [[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
-[[noreturn, gnu::noinline]] void failExpected(std::string_view name, const char *what,
+[[noreturn, gnu::noinline]] void failExpected(const char *name, const char *what,
                                               const char *position) {
   throw Exception(std::string(name) + " expected " + what, position);
 }
-[[noreturn, gnu::noinline]] void failUnknown(std::string_view name, const char *position) {
-  throw Exception("unexpected symbol: " + std::string(name), position);
+[[noreturn, gnu::noinline]] void failUnknown(const char *name, const char *after) {
+  throw Exception("unexpected symbol: " + std::string(name, after), name);
+}
+
+enum class Word { kNone, kMin, kMax, kCeil, kNot, kTrue, kFalse };
+
+[[gnu::noinline]] Word wordOf(const char *name, const char *after) {
+  const std::string_view text(name, static_cast<size_t>(after - name));
+  if (text == "min") return Word::kMin;
+  if (text == "max") return Word::kMax;
+  if (text == "ceil") return Word::kCeil;
+  if (text == "not") return Word::kNot;
+  if (text == "True") return Word::kTrue;
+  if (text == "False") return Word::kFalse;
+  return Word::kNone;
 }
 
 // The cursor says where reading stopped. It is a member, not a local of every level, to keep the
@@ -78,15 +91,15 @@ class Reader {
   float readParenthesis(const char *open);
   float readNumber(const char *start);
   float readNamed(const char *start);
-  float readMinMax(std::string_view name, const char *after);
-  float readCeil(std::string_view name, const char *after);
+  float readMinMax(Word word, const char *after);
+  float readCeil(const char *after);
   float readNot(const char *after);
   float readChain(float value);
   float readAnd(const char *word, float value);
   float readOr(const char *word, float value);
   float readIf(const char *word, float value);
 
-  [[gnu::noinline]] const float *findVariable(std::string_view name) const;
+  const float *findVariable(const char *name, const char *after) const;
   void enterLevel(const char *place);
   void takeOperator(const char *place);
 
@@ -180,27 +193,38 @@ float Reader::readNumber(const char *start) {
 float Reader::readNamed(const char *start) {
   const char *after = start;
   while (isNamePart(*after)) ++after;
-  const std::string_view name(start, static_cast<size_t>(after - start));
-  if (const float *variable = findVariable(name)) {
+  if (const float *variable = findVariable(start, after)) {
     cursor_ = after;
     return *variable;
   }
-  if (name == "min" || name == "max") return readMinMax(name, after);
-  if (name == "ceil") return readCeil(name, after);
-  if (name == "not") return readNot(after);
-  // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
-  if (name == "True") return 1.0F;
-  if (name == "False") return 0.0F;
-  failUnknown(name, start);
+  const Word word = wordOf(start, after);
+  switch (word) {
+    case Word::kMin:
+    case Word::kMax:
+      return readMinMax(word, after);
+    case Word::kCeil:
+      return readCeil(after);
+    case Word::kNot:
+      return readNot(after);
+    // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
+    case Word::kTrue:
+      return 1.0F;
+    case Word::kFalse:
+      return 0.0F;
+    case Word::kNone:
+      break;
+  }
+  failUnknown(start, after);
 }
 
-const float *Reader::findVariable(std::string_view name) const {
-  const auto found = variables_.find(std::string(name));
+[[gnu::noinline]] const float *Reader::findVariable(const char *name, const char *after) const {
+  const auto found = variables_.find(std::string(name, after));
   return found == variables_.end() ? nullptr : &found->second;
 }
 
 // On a tie, or with a NaN, the first argument wins.
-float Reader::readMinMax(std::string_view name, const char *after) {
+float Reader::readMinMax(Word word, const char *after) {
+  const char *const name = word == Word::kMin ? "min" : "max";
   const char *const open = skipSpace(after);
   if (*open != '(') failExpected(name, "(", open);
   cursor_ = open;
@@ -209,16 +233,16 @@ float Reader::readMinMax(std::string_view name, const char *after) {
   const float b = ParseExpression(skipSpace(cursor_ + 1), 0.0F);
   if (*cursor_ != ')') failExpected(name, ")", cursor_);
   ++cursor_;
-  const bool second = name == "min" ? b < a : b > a;
+  const bool second = word == Word::kMin ? b < a : b > a;
   return second ? b : a;
 }
 
-float Reader::readCeil(std::string_view name, const char *after) {
+float Reader::readCeil(const char *after) {
   const char *const open = skipSpace(after);
-  if (*open != '(') failExpected(name, "(", open);
+  if (*open != '(') failExpected("ceil", "(", open);
   cursor_ = open;
   const float value = std::ceil(ParseExpression(skipSpace(open + 1), 0.0F));
-  if (*cursor_ != ')') failExpected(name, ")", cursor_);
+  if (*cursor_ != ')') failExpected("ceil", ")", cursor_);
   ++cursor_;
   return value;
 }

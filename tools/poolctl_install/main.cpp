@@ -22,7 +22,7 @@ int main(int argc, char **argv) {
   app.footer(
       "Exit status: 0 done; 1 refused or failed; 2 wrong usage; 3 no such file. Nothing has "
       "changed "
-      "unless it is 0.");
+      "unless it is 0.\n");
   return Tools::runTool(app, argc, argv, [&] {
     if (mark) {
       Install::markFiles(operands);

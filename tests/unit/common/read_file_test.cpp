@@ -1,0 +1,46 @@
+#include "common/read_file.h"
+
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <system_error>
+
+#include "temp_folder.h"
+
+namespace Platform {
+namespace {
+
+int errnoOf(const std::string &path, size_t mostBytes) {
+  try {
+    (void)readFile(path, mostBytes);
+  } catch (const std::system_error &error) {
+    return error.code().value();
+  }
+  return 0;
+}
+
+TEST(ReadFile, GivesEveryByte) {
+  const ::Test::TempFolder folder;
+  const std::string content = std::string("a\0b\n", 4) + std::string(10000, 'x');
+  ::Test::writeFile(folder.path() / "file", content);
+  EXPECT_EQ(readFile(folder.path() / "file", content.size()), content);
+}
+
+TEST(ReadFile, ReadsFilesThatHaveNoSize) {
+  EXPECT_FALSE(readFile("/proc/self/stat", 65536).empty());
+}
+
+TEST(ReadFile, RefusesALargerFile) {
+  const ::Test::TempFolder folder;
+  ::Test::writeFile(folder.path() / "file", "12345");
+  EXPECT_EQ(errnoOf(folder.path() / "file", 4), EFBIG);
+}
+
+TEST(ReadFile, SaysWhyItCannot) {
+  const ::Test::TempFolder folder;
+  EXPECT_EQ(errnoOf(folder.path() / "none", 10), ENOENT);
+  EXPECT_EQ(errnoOf(folder.path(), 10), EISDIR);
+}
+
+}  // namespace
+}  // namespace Platform
