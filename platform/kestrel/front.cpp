@@ -84,7 +84,9 @@ struct Opened {
 
 std::shared_ptr<Backend> openedBackend() {
   static std::mutex mutex;
-  static std::shared_ptr<Opened> opened = std::make_shared<Opened>();
+  // Never destroyed: exit handlers may still read, and a child's exit must not close what is its
+  // parent's.
+  static auto &opened = *new std::shared_ptr<Opened>(std::make_shared<Opened>());
   const std::lock_guard<std::mutex> lock(mutex);
 
   Configuration configuration = readConfiguration();

@@ -54,17 +54,24 @@ Value valueOf(const Run &row) {
   throw SqliteError(SQLITE_CORRUPT, "field \"" + row.text(0) + "\" holds no " + row.text(1));
 }
 
-std::optional<int64_t> findObject(Database &database, const ObjectId &id) {
-  Statement find(database, kFindObject);
-  Run run(find, id.component, id.group, id.key, id.extra);
-  return run.step() ? std::optional(run.integer(0)) : std::nullopt;
-}
+// The rows of objects by their ids, for one change.
+class Objects {
+ public:
+  explicit Objects(Database &database) : add_(database, kAddObject), find_(database, kFindObject) {}
 
-int64_t addObject(Database &database, const ObjectId &id) {
-  Statement add(database, kAddObject);
-  Run(add, id.component, id.group, id.key, id.extra).finish();
-  return findObject(database, id).value();
-}
+  std::optional<int64_t> find(const ObjectId &id) {
+    Run run(find_, id.component, id.group, id.key, id.extra);
+    return run.step() ? std::optional(run.integer(0)) : std::nullopt;
+  }
+
+  int64_t findOrAdd(const ObjectId &id) {
+    Run(add_, id.component, id.group, id.key, id.extra).finish();
+    return find(id).value();
+  }
+
+ private:
+  Statement add_, find_;
+};
 
 void writeField(Statement &put, int64_t object, const std::string &name, const Value &value) {
   const std::string_view type = typeName(typeOf(value));
@@ -129,11 +136,11 @@ std::vector<StoredObject> selectObjects(Database &database, const Selection &sel
 void putField(Database &database, const ObjectId &id, const std::string &field,
               const Value &value) {
   Statement put(database, kPutField);
-  writeField(put, addObject(database, id), field, value);
+  writeField(put, Objects(database).findOrAdd(id), field, value);
 }
 
 bool removeField(Database &database, const ObjectId &id, const std::string &field) {
-  const auto object = findObject(database, id);
+  const auto object = Objects(database).find(id);
   if (!object) return false;
   Statement remove(database, kRemoveField);
   Run(remove, *object, field).finish();
@@ -144,7 +151,7 @@ bool removeField(Database &database, const ObjectId &id, const std::string &fiel
 }
 
 bool removeObject(Database &database, const ObjectId &id) {
-  const auto object = findObject(database, id);
+  const auto object = Objects(database).find(id);
   if (!object) return false;
   Statement remove(database, kRemoveObject);
   Run(remove, *object).finish();
@@ -152,10 +159,11 @@ bool removeObject(Database &database, const ObjectId &id) {
 }
 
 void replaceObjects(Database &database, const std::vector<StoredObject> &objects) {
+  Objects rows(database);
   Statement clear(database, kRemoveFields);
   Statement put(database, kPutField);
   for (const StoredObject &object : objects) {
-    const int64_t id = addObject(database, object.id);
+    const int64_t id = rows.findOrAdd(object.id);
     Run(clear, id).finish();
     for (const auto &[name, value] : object.fields) writeField(put, id, name, value);
   }

@@ -7,8 +7,9 @@ namespace Kestrel {
 
 namespace {
 
-// What `file` and SQLite know a store by: "KSTR".
+// What `file` and SQLite know a store by: the letters KSTR, and 1263752274 in the text below.
 constexpr int64_t kApplicationId = 0x4B535452;
+static_assert(kApplicationId == 1263752274 && kSchemaVersion == 1);
 
 // A real that is not a number is kept as the text 'nan', because SQLite makes NULL of NaN.
 constexpr const char *kTables = R"sql(

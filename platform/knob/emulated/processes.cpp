@@ -3,8 +3,9 @@
 
 #include <unistd.h>
 
-#include <sstream>
+#include <charconv>
 #include <string>
+#include <string_view>
 #include <system_error>
 
 #include "common/read_file.h"
@@ -23,33 +24,45 @@ std::optional<std::string> readProcessFile(int64_t pid, const char *file) {
   }
 }
 
+// The field of that number, counted from 0, of a text whose fields stand between single blanks.
+std::string_view field(std::string_view text, int index) {
+  size_t start = text.find_first_not_of(' ');
+  for (; index > 0 && start != std::string_view::npos; --index) {
+    start = text.find(' ', start);
+    if (start != std::string_view::npos) ++start;
+  }
+  if (start == std::string_view::npos) return {};
+  return text.substr(start, text.find_first_of(" \n", start) - start);
+}
+
+std::optional<int64_t> number(std::string_view digits) {
+  int64_t value = 0;
+  const auto [stop, error] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
+  if (error != std::errc()) return std::nullopt;
+  return value;
+}
+
 }  // namespace
 
 std::optional<int64_t> processStart(int64_t pid) {
   const auto stat = readProcessFile(pid, "stat");
   if (!stat) return std::nullopt;
   // "PID (NAME) STATE ...": the name may hold blanks and parentheses, so what follows is counted
-  // from the last one. The start is the 22nd field of the line.
+  // from the last one. The start is the 22nd field of the line, the state the 3rd.
   const size_t nameEnd = stat->rfind(')');
   if (nameEnd == std::string::npos) return std::nullopt;
-  std::istringstream fields(stat->substr(nameEnd + 1));
-  std::string state, skipped;
-  fields >> state;
+  const std::string_view fields = std::string_view(*stat).substr(nameEnd + 1);
+  const std::string_view state = field(fields, 0);
   if (state == "Z" || state == "X") return std::nullopt;
-  constexpr int kFieldsBetween = 18;
-  for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
-  int64_t start = 0;
-  if (!(fields >> start)) return std::nullopt;
-  return start;
+  constexpr int kStartField = 22 - 3;
+  return number(field(fields, kStartField));
 }
 
 uint64_t residentBytes(int64_t pid) {
   const auto statm = readProcessFile(pid, "statm");
   if (!statm) return 0;
-  std::istringstream fields(*statm);
-  uint64_t size = 0, residentPages = 0;
-  if (!(fields >> size >> residentPages)) return 0;
-  return residentPages * static_cast<uint64_t>(::sysconf(_SC_PAGESIZE));
+  const auto pages = static_cast<uint64_t>(number(field(*statm, 1)).value_or(0));
+  return pages * static_cast<uint64_t>(::sysconf(_SC_PAGESIZE));
 }
 
 }  // namespace Knob

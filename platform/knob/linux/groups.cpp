@@ -43,17 +43,28 @@ int keep(Group &group, UniqueFd file) {
 
 }  // namespace
 
+Groups::Groups(Hierarchy hierarchy) : hierarchy_(std::move(hierarchy)) {
+  Identity identity;
+  if (const int error = identify(hierarchy_.directory.get(), "", identity); error != 0) {
+    fail(error, "cannot look at " + hierarchy_.path);
+  }
+  mount_ = identity.mount;
+}
+
 GroupPtr Groups::lookUp(std::string_view path) {
   const std::string text(path);
   if (const auto known = paths_.find(text); known != paths_.end()) {
     // Groups are never renamed: while the path still leads to this id, all that was checked when
     // it was first looked up holds.
     Identity identity;
-    if (identify(hierarchy_.directory.get(), text.c_str(), identity) == 0 &&
-        identity.id == known->second) {
-      return find(identity.id);
+    const auto open = groups_.find(known->second);
+    if (open != groups_.end()) {
+      if (identify(hierarchy_.directory.get(), text.c_str(), identity) == 0 &&
+          identity.id == known->second) {
+        return find(identity.id);
+      }
+      groups_.erase(open);
     }
-    groups_.erase(known->second);
     paths_.erase(known);
   }
   UniqueFd directory;
@@ -101,6 +112,8 @@ GroupPtr Groups::parentOf(Group &group) {
   if (const int error = identify(directory.get(), "", identity); error != 0) {
     fail(error, "cannot tell the id of the group above");
   }
+  // Above the mount's own root stand other file systems, with numbers of their own.
+  if (identity.mount != mount_) notFound();
   group.parent = identity.id;
   return adopt(std::move(directory), identity.id);
 }
@@ -113,7 +126,9 @@ GroupPtr Groups::make(Group &parent, std::string_view name) {
 
 GroupPtr Groups::makeHost() {
   passOnToHost();
-  return makeIn(hierarchy_.directory.get(), kRootName);
+  const GroupPtr host = makeIn(hierarchy_.directory.get(), kRootName);
+  hostId_ = host->id;
+  return host;
 }
 
 GroupPtr Groups::makeIn(int parentDirectory, std::string_view name) {
@@ -251,16 +266,15 @@ GroupPtr Groups::adopt(UniqueFd directory, GroupId id) {
 
 // An id is known to the whole machine; only what is below host is ours.
 GroupPtr Groups::findUpwards(UniqueFd directory, GroupId id) {
-  // Somebody may have removed host and another process made it again.
+  // Somebody may have removed host, and another process made it again.
   if (!lookUp(kRootName)) notFound();
   const GroupPtr group = adopt(std::move(directory), id);
-  GroupId last = 0;
-  for (GroupPtr at = group; at->id != hostId_; last = at->id, at = parentOf(*at)) {
-    if (at->id == last) {
-      // The top of the mount is its own parent: none of these are below host.
-      groups_.clear();
-      notFound();
+  try {
+    for (GroupPtr at = group; at->id != hostId_; at = parentOf(*at)) {
     }
+  } catch (const KernelError &) {
+    groups_.clear();
+    throw;
   }
   return group;
 }

@@ -40,7 +40,7 @@ struct Child {
 
 class Groups {
  public:
-  explicit Groups(Hierarchy hierarchy) : hierarchy_(std::move(hierarchy)) {}
+  explicit Groups(Hierarchy hierarchy);
 
   const Hierarchy &hierarchy() const { return hierarchy_; }
 
@@ -95,6 +95,7 @@ class Groups {
   void makeRoom();
 
   Hierarchy hierarchy_;
+  uint64_t mount_ = 0;
   std::unordered_map<GroupId, GroupPtr> groups_;
   std::unordered_map<std::string, GroupId> paths_;
   GroupId hostId_ = 0;

@@ -12,6 +12,7 @@
 namespace {
 
 using ::Test::Arguments;
+using ::Test::lines;
 using ::Test::ProcessResult;
 using ::Test::readFile;
 using ::Test::withoutFolder;
@@ -235,6 +236,26 @@ TEST_F(Kestrelctl, AnImportThatFailsMakesNoStore) {
   EXPECT_THAT(err(1, {"import", path("nowhere.yaml")}),
               "kestrelctl: FOLDER/nowhere.yaml: No such file or directory\n");
   EXPECT_FALSE(fs::exists(path("store.db")));
+}
+
+TEST_F(Kestrelctl, AnImportThatRunsOutOfRoomHalfwayChangesNothing) {
+  set("x", "1");
+  std::string text;
+  for (int i = 0; i < 20000; ++i) {
+    text += "- {component: host, group: pools, key: k" + std::to_string(i) + ", fields: {y: 2}}\n";
+  }
+  writeFile(path("in.yaml"), text);
+  ::Test::Command shell;  // files of 64 KB at most
+  shell.program = "/bin/sh";
+  shell.arguments = {"-c", "trap '' XFSZ; ulimit -f 128; exec kestrelctl import in.yaml"};
+  shell.environment = world_.environment;
+  shell.workingFolder = world_.folder();
+  const ProcessResult result = ::Test::run(shell);
+  EXPECT_EQ(result.status, 1);
+  EXPECT_THAT(result.err, HasSubstr("store.db: "));
+  EXPECT_EQ(out({"list"}), "host\tpools\tbackup\t\tx\tinteger\t1\n");
+  EXPECT_EQ(out({"import", path("in.yaml")}), "");
+  EXPECT_EQ(lines(out({"list"})).size(), 20001U);
 }
 
 TEST_F(Kestrelctl, AnExportThatFailsLeavesTheOlderOne) {

@@ -1,0 +1,354 @@
+// The C functions: null and small buffers, one wrapper for what is thrown, and what they answer
+// when memory ends. Built with the library's own objects, so that allocations can be made to fail.
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+#include <cstring>
+#include <functional>
+#include <new>
+
+#include "common/sqlite.h"
+#include "knob/live_kernel.h"
+#include "knob/signature.h"
+#include "knob/status.h"
+#include "platform/knob.h"
+#include "temp_folder.h"
+
+namespace {
+
+// The allocation that fails, counted down; negative: none does.
+thread_local int allocationsLeft = -1;
+
+}  // namespace
+
+void *operator new(size_t size) {
+  if (allocationsLeft == 0) throw std::bad_alloc();
+  if (allocationsLeft > 0) --allocationsLeft;
+  if (void *memory = std::malloc(size == 0 ? 1 : size)) return memory;
+  throw std::bad_alloc();
+}
+void *operator new(size_t size, const std::nothrow_t &) noexcept {
+  if (allocationsLeft == 0) return nullptr;
+  if (allocationsLeft > 0) --allocationsLeft;
+  return std::malloc(size == 0 ? 1 : size);
+}
+void operator delete(void *memory) noexcept {
+  std::free(memory);
+}
+void operator delete(void *memory, size_t) noexcept {
+  std::free(memory);
+}
+
+namespace Knob {
+namespace {
+
+constexpr KNOB_ReturnStatus number(Status status) {
+  return static_cast<uint32_t>(status);
+}
+
+class Abi : public testing::Test {
+ protected:
+  Abi() {
+    ::Test::writeFile(conf_, "state = " + state_ + "\n");
+    ::setenv("KNOB_CONF", conf_.c_str(), 1);
+    LiveKernel::instance().close();
+  }
+  ~Abi() override {
+    LiveKernel::instance().close();
+    KNOB_ParamListDestroy(instance_);
+    KNOB_ParamListDestroy(path_);
+    KNOB_ParamListDestroy(settings_);
+  }
+
+  static KNOB_ParamList *textList(const char *text) {
+    KNOB_ParamList *list = KNOB_ParamListCreate(0, 1);
+    EXPECT_EQ(KNOB_ParamListAddString(list, text), 0U);
+    return list;
+  }
+  static KNOB_ParamList *idList(int64_t id) {
+    KNOB_ParamList *list = KNOB_ParamListCreate(1, 1);
+    EXPECT_EQ(KNOB_ParamListAddInt(list, id), 0U);
+    return list;
+  }
+  KNOB_ReturnStatus lookUp(int64_t *id) {
+    return KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, path_, id, sizeof(*id));
+  }
+
+  const ::Test::TempFolder folder_;
+  const std::string conf_ = folder_.path() / "knob.conf";
+  const std::string state_ = folder_.path() / "kernel.db";
+  KNOB_ParamList *instance_ = idList(2);  // host/opt
+  KNOB_ParamList *path_ = textList("host/opt");
+  KNOB_ParamList *settings_ = textList("min=1");
+};
+
+TEST_F(Abi, AListTakesAsManyEntriesAsItsCapacity) {
+  KNOB_ParamList *list = KNOB_ParamListCreate(0, 2);
+  EXPECT_EQ(KNOB_ParamListNumInstances(list), 0);
+  EXPECT_EQ(KNOB_ParamListAddInt(list, 1), 0U);
+  EXPECT_EQ(KNOB_ParamListAddString(list, "text"), 0U);
+  EXPECT_EQ(KNOB_ParamListAddInt(list, 3), number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_ParamListAddString(list, "more"), number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_ParamListNumInstances(list), 2);
+  KNOB_ParamListDestroy(list);
+}
+
+TEST_F(Abi, AListOfAnUnknownKindOrSizeIsNotMade) {
+  EXPECT_EQ(KNOB_ParamListCreate(2, 1), nullptr);
+  EXPECT_EQ(KNOB_ParamListCreate(-1, 1), nullptr);
+  EXPECT_EQ(KNOB_ParamListCreate(0, -1), nullptr);
+  KNOB_ParamList *none = KNOB_ParamListCreate(1, 0);
+  ASSERT_NE(none, nullptr);
+  EXPECT_EQ(KNOB_ParamListAddInt(none, 1), number(Status::kBadParameter));
+  KNOB_ParamListDestroy(none);
+  KNOB_ParamList *large = KNOB_ParamListCreate(1, INT32_MAX);
+  ASSERT_NE(large, nullptr) << "room is made when it is needed";
+  KNOB_ParamListDestroy(large);
+}
+
+TEST_F(Abi, NullIsAStatusOrNothing) {
+  EXPECT_EQ(KNOB_ParamListAddInt(nullptr, 1), number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_ParamListAddString(nullptr, "x"), number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_ParamListAddString(path_, nullptr), number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_ParamListNumInstances(nullptr), 0);
+  KNOB_ParamListDestroy(nullptr);
+  EXPECT_EQ(KNOB_Get(KNOB_NODE_hardware_cpu_cpuInfo, nullptr, nullptr, 38),
+            number(Status::kBufferSize));
+  EXPECT_EQ(KNOB_Set(KNOB_NODE_sched_groups_delete, nullptr, nullptr, nullptr, 0),
+            number(Status::kBadParameter));
+  EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, instance_, nullptr),
+            number(Status::kBufferSize));
+}
+
+TEST_F(Abi, AListCopiesItsTexts) {
+  char text[] = "host/opt";
+  KNOB_ParamList *list = textList(text);
+  std::memset(text, 'x', sizeof(text) - 1);
+  int64_t id = 0;
+  EXPECT_EQ(KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, list, &id, sizeof(id)), 0U);
+  KNOB_ParamListDestroy(list);
+}
+
+TEST_F(Abi, AnInstanceListIsTheCallersToDestroy) {
+  KNOB_ParamList *hosts = idList(1);
+  KNOB_ParamList *result = nullptr;
+  EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, hosts, &result), 0U);
+  EXPECT_EQ(KNOB_ParamListNumInstances(result), 1);
+  EXPECT_EQ(KNOB_ParamListAddInt(result, 1), number(Status::kBadParameter)) << "it is full";
+  // It is a list of instances like any other.
+  KNOB_ParamList *below = nullptr;
+  EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, result, &below), 0U);
+  EXPECT_EQ(KNOB_ParamListNumInstances(below), 0);
+  for (KNOB_ParamList *list : {hosts, result, below}) KNOB_ParamListDestroy(list);
+}
+
+TEST_F(Abi, AFailedInstanceListLeavesTheResultUntouched) {
+  KNOB_ParamList *gone = idList(999);
+  KNOB_ParamList *result = settings_;
+  EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, gone, &result),
+            number(Status::kNotFound));
+  EXPECT_EQ(result, settings_);
+  KNOB_ParamListDestroy(gone);
+}
+
+TEST_F(Abi, NodesHaveNumbersOfTheirOwn) {
+  EXPECT_NE(KNOB_NODE_system_vmLimits, KNOB_NODE_system_bootCmdLine);
+  EXPECT_EQ(KNOB_Get(0, nullptr, nullptr, 0), number(Status::kBadNode));
+  EXPECT_EQ(KNOB_Get(0xffff, nullptr, nullptr, 0), number(Status::kBadNode));
+}
+
+class Signature : public Abi {
+ protected:
+  void bootByAnotherBuild() {
+    int64_t id = 0;
+    ASSERT_EQ(lookUp(&id), 0U);
+    LiveKernel::instance().close();
+    Platform::Database(state_, Platform::Database::Mode::kReadWrite, 0)
+        .execute("UPDATE kernel SET md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
+  }
+};
+
+TEST_F(Signature, TheSameBuildMatches) {
+  char running[21] = "untouched";
+  const char *mine = nullptr;
+  EXPECT_EQ(KNOB_CheckSig(running, sizeof(running), &mine), 0);
+  EXPECT_STREQ(running, "untouched");
+  EXPECT_EQ(mine, nullptr);
+}
+
+TEST_F(Signature, AnotherInterfaceIsAMismatchWithBothDates) {
+  bootByAnotherBuild();
+  char running[21];
+  const char *mine = nullptr;
+  EXPECT_NE(KNOB_CheckSig(running, sizeof(running), &mine), 0);
+  EXPECT_STREQ(running, "Jan  1 2001 01:02:03");
+  EXPECT_STREQ(mine, buildDate());
+}
+
+TEST_F(Signature, ASmallBufferGetsWhatFits) {
+  bootByAnotherBuild();
+  char running[] = "xxxxxxxx";
+  const char *mine = nullptr;
+  EXPECT_NE(KNOB_CheckSig(running, 4, &mine), 0);
+  EXPECT_STREQ(running, "Jan");
+  EXPECT_EQ(running[4], 'x');
+}
+
+TEST_F(Signature, NullBuffersAreAllowed) {
+  bootByAnotherBuild();
+  char running[] = "x";
+  EXPECT_NE(KNOB_CheckSig(nullptr, 21, nullptr), 0);
+  EXPECT_NE(KNOB_CheckSig(running, 0, nullptr), 0);
+  EXPECT_NE(KNOB_CheckSig(running, -1, nullptr), 0);
+  EXPECT_STREQ(running, "x");
+}
+
+using NotUsable = Abi;
+
+TEST_F(NotUsable, ABadConfigurationIsTheAnswerOfEveryCall) {
+  ::Test::writeFile(conf_, "kernel = good\n");
+  const auto expected = number(Status::kKernelNotUsable);
+  char output[4096];
+  int64_t id = -1;
+  KNOB_ParamList *result = nullptr;
+  EXPECT_EQ(KNOB_Get(KNOB_NODE_hardware_cpu_cpuInfo, nullptr, output, sizeof(output)), expected);
+  EXPECT_EQ(KNOB_Get(0xffff, nullptr, nullptr, 0), expected);
+  EXPECT_EQ(lookUp(&id), expected);
+  EXPECT_EQ(id, -1);
+  EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, instance_, &result),
+            expected);
+  EXPECT_EQ(KNOB_CheckSig(output, 21, nullptr), 0) << "no mismatch is known";
+}
+
+TEST_F(NotUsable, TheNextCallLooksAfresh) {
+  ::Test::writeFile(conf_, "kernel = good\n");
+  int64_t id = -1;
+  ASSERT_EQ(lookUp(&id), number(Status::kKernelNotUsable));
+  ::Test::writeFile(conf_, "state = " + state_ + "\n");
+  EXPECT_EQ(lookUp(&id), 0U);
+}
+
+TEST_F(NotUsable, AStateThatIsDamagedWhileItIsOpenIsLetGo) {
+  int64_t id = -1;
+  ASSERT_EQ(lookUp(&id), 0U);
+  Platform::Database(state_, Platform::Database::Mode::kReadWrite, 0).execute("DELETE FROM kernel");
+  char output[38];
+  EXPECT_EQ(KNOB_Get(KNOB_NODE_hardware_cpu_cpuInfo, nullptr, output, sizeof(output)),
+            number(Status::kKernelNotUsable));
+  EXPECT_EQ(lookUp(&id), number(Status::kKernelNotUsable));
+}
+
+// Runs a call with its first allocation failing, then its second, and so on until it succeeds.
+void expectOutOfMemoryUntilDone(
+    const std::function<KNOB_ReturnStatus()> &call,
+    const std::function<void()> &afterFailure = [] {}) {
+  constexpr int kMost = 500;
+  for (int nth = 0; nth < kMost; ++nth) {
+    allocationsLeft = nth;
+    const KNOB_ReturnStatus status = call();
+    allocationsLeft = -1;
+    if (status == 0) {
+      EXPECT_GT(nth, 0) << "nothing was made to fail";
+      return;
+    }
+    ASSERT_EQ(status, number(Status::kOutOfMemory)) << nth;
+    afterFailure();
+  }
+  FAIL() << "never succeeded";
+}
+
+class OutOfMemory : public Abi {
+ protected:
+  int childrenOfOpt() {
+    KNOB_ParamList *result = nullptr;
+    EXPECT_EQ(KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, instance_, &result),
+              0U);
+    const int count = KNOB_ParamListNumInstances(result);
+    KNOB_ParamListDestroy(result);
+    return count;
+  }
+};
+
+TEST_F(OutOfMemory, AListIsNull) {
+  allocationsLeft = 0;
+  KNOB_ParamList *list = KNOB_ParamListCreate(0, 1);
+  allocationsLeft = -1;
+  EXPECT_EQ(list, nullptr);
+}
+
+TEST_F(OutOfMemory, AnEntryIsNotAdded) {
+  KNOB_ParamList *list = KNOB_ParamListCreate(0, 1);
+  const std::string text(100, 'x');
+  expectOutOfMemoryUntilDone([&] { return KNOB_ParamListAddString(list, text.c_str()); },
+                             [&] { EXPECT_EQ(KNOB_ParamListNumInstances(list), 0); });
+  EXPECT_EQ(KNOB_ParamListNumInstances(list), 1);
+  KNOB_ParamListDestroy(list);
+}
+
+TEST_F(OutOfMemory, TheFirstUseCanBeTriedAgain) {
+  int64_t id = -1;
+  expectOutOfMemoryUntilDone([&] { return lookUp(&id); }, [&] { EXPECT_EQ(id, -1); });
+  EXPECT_EQ(id, 2);
+}
+
+TEST_F(OutOfMemory, OpeningAStateCanBeTriedAgain) {
+  int64_t id = -1;
+  ASSERT_EQ(lookUp(&id), 0U);
+  LiveKernel::instance().close();
+  expectOutOfMemoryUntilDone([&] { return lookUp(&id); });
+}
+
+TEST_F(OutOfMemory, NoGroupIsMade) {
+  KNOB_ParamList *name = textList("a name that no short text of a library can hold");
+  int64_t id = -1;
+  ASSERT_EQ(childrenOfOpt(), 0);
+  expectOutOfMemoryUntilDone(
+      [&] {
+        LiveKernel::instance().close();
+        return KNOB_Set(KNOB_NODE_sched_groups_groupCreate, instance_, name, &id, sizeof(id));
+      },
+      [&] { EXPECT_EQ(childrenOfOpt(), 0); });
+  EXPECT_EQ(childrenOfOpt(), 1);
+  KNOB_ParamListDestroy(name);
+}
+
+TEST_F(OutOfMemory, NoAllocationIsChanged) {
+  char record[36] = {};
+  const auto min = [&] {
+    EXPECT_EQ(KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance_, record, 36), 0U);
+    return record[0];
+  };
+  ASSERT_EQ(min(), 0);
+  expectOutOfMemoryUntilDone(
+      [&] {
+        return KNOB_Set(KNOB_NODE_sched_groups_memAllocationInMB, instance_, settings_, nullptr, 0);
+      },
+      [&] { EXPECT_EQ(min(), 0); });
+  EXPECT_EQ(min(), 1);
+}
+
+TEST_F(OutOfMemory, NoInstanceListIsHandedOut) {
+  KNOB_ParamList *hosts = idList(1);
+  KNOB_ParamList *result = nullptr;
+  expectOutOfMemoryUntilDone(
+      [&] {
+        return KNOB_GetInstanceListAlloc(KNOB_NODE_sched_groups_members_groups, hosts, &result);
+      },
+      [&] { EXPECT_EQ(result, nullptr); });
+  EXPECT_EQ(KNOB_ParamListNumInstances(result), 1);
+  KNOB_ParamListDestroy(result);
+  KNOB_ParamListDestroy(hosts);
+}
+
+TEST_F(OutOfMemory, AProcessJoinsOrDoesNot) {
+  int64_t id = -1;
+  ASSERT_EQ(lookUp(&id), 0U);
+  KNOB_ParamList *pids = KNOB_ParamListCreate(0, 1);
+  ASSERT_EQ(KNOB_ParamListAddInt(pids, ::getpid()), 0U);
+  expectOutOfMemoryUntilDone(
+      [&] { return KNOB_Set(KNOB_NODE_sched_groups_members_worlds, instance_, pids, nullptr, 0); });
+  KNOB_ParamListDestroy(pids);
+}
+
+}  // namespace
+}  // namespace Knob

@@ -1,0 +1,476 @@
+// The emulated kernel's state: how it comes to be, what may be wrong with it, and what a boot does.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <functional>
+
+#include "common/sqlite.h"
+#include "knob/emulated/emulated_kernel.h"
+#include "knob/emulated/state_file.h"
+#include "knob/machine_facts.h"
+#include "knob/signature.h"
+#include "temp_folder.h"
+
+namespace Knob {
+namespace {
+
+using testing::HasSubstr;
+
+struct Refusal {
+  Status status;
+  std::string reason;
+};
+
+Refusal refusalOf(const std::function<void()> &call) {
+  try {
+    call();
+  } catch (const KernelError &error) {
+    return {error.status, error.what()};
+  }
+  return {Status::kSuccess, ""};
+}
+
+// What the call ends with in a process of another user; -1: it did not end by itself.
+int asNobody(const std::function<int()> &call) {
+  const pid_t pid = ::fork();
+  if (pid == 0) {
+    if (::setgid(65534) != 0 || ::setuid(65534) != 0) ::_exit(99);
+    ::_exit(call());
+  }
+  int status = 0;
+  if (::waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) return -1;
+  return WEXITSTATUS(status);
+}
+
+class State : public testing::Test {
+ protected:
+  State() { configuration_.statePath = path_; }
+
+  std::unique_ptr<Kernel> open() { return openEmulatedKernel(configuration_); }
+  std::string notUsable() {
+    const Refusal refusal = refusalOf([this] { (void)open(); });
+    EXPECT_EQ(refusal.status, Status::kKernelNotUsable);
+    return refusal.reason;
+  }
+  void boot(const BootFacts &facts, bool force) {
+    bootEmulatedKernel(configuration_, facts, force);
+  }
+  void execute(const char *sql) {
+    Platform::Database(path_, Platform::Database::Mode::kReadWrite, 1000).execute(sql);
+  }
+  static void setMin(Kernel &kernel, GroupId id, int64_t min) {
+    AllocationChange change;
+    change.min = min;
+    kernel.setAllocation(id, Resource::kMemory, change);
+  }
+
+  const ::Test::TempFolder folder_;
+  const std::string path_ = folder_.path() / "kernel.db";
+  Configuration configuration_;
+};
+
+TEST_F(State, TheFirstUseBootsWithThisMachinesFacts) {
+  const HostFacts facts = open()->facts();
+  const HostFacts machine = readMachineFacts();
+  EXPECT_EQ(facts.cpus, machine.cpus);
+  EXPECT_EQ(facts.isVm, machine.isVm);
+  EXPECT_EQ(facts.memoryKB, machine.memoryKB);
+  EXPECT_EQ(facts.bootCommandLine, machine.bootCommandLine);
+  EXPECT_GT(facts.cpus, 0U);
+  EXPECT_GT(facts.memoryKB, 1024U);
+}
+
+TEST_F(State, MaxVmsIsTheConfigurationsUnlessTheBootHadOneOfItsOwn) {
+  configuration_.maxVms = 5;
+  EXPECT_EQ(open()->facts().maxVms, 5U);
+  BootFacts facts;
+  facts.maxVms = 6;
+  boot(facts, false);
+  EXPECT_EQ(open()->facts().maxVms, 6U);
+}
+
+TEST_F(State, TheSignatureIsThatOfTheLibraryThatBooted) {
+  EXPECT_EQ(open()->signature().md5, buildSignature().md5);
+  EXPECT_EQ(open()->signature().buildDate, buildDate());
+  EXPECT_EQ(buildSignature().md5.size(), 32U);
+  EXPECT_EQ(std::string(buildDate()).size(), 20U);
+}
+
+TEST_F(State, NothingIsLeftBesideItWhenAllHaveClosedIt) {
+  { (void)open(); }
+  size_t files = 0;
+  for (const auto &entry : std::filesystem::directory_iterator(folder_.path())) {
+    EXPECT_EQ(entry.path().filename().string().substr(0, 9), "kernel.db");
+    EXPECT_EQ(entry.path().string().find(".boot"), std::string::npos);
+    ++files;
+  }
+  EXPECT_LE(files, 4U);
+}
+
+TEST_F(State, AnEmptyFileIsNoStateYet) {
+  ::Test::writeFile(path_, "");
+  EXPECT_GT(open()->lookUp("host/opt"), 0);
+}
+
+TEST_F(State, WhatABootThatWasKilledLeftIsNoHindrance) {
+  ::Test::writeFile(path_ + ".boot", "half a state");
+  ::Test::writeFile(path_ + ".boot-wal", "and its log");
+  ::Test::writeFile(path_ + "-wal", "of a state that was removed");
+  EXPECT_GT(open()->lookUp("host/opt"), 0);
+}
+
+TEST_F(State, ProcessesThatStartTogetherBootOneKernel) {
+  std::vector<pid_t> pids;
+  for (int i = 0; i < 6; ++i) {
+    const pid_t pid = ::fork();
+    if (pid == 0) {
+      try {
+        open()->create(2, "pool" + std::to_string(i));
+        ::_exit(0);
+      } catch (...) {
+        ::_exit(1);
+      }
+    }
+    pids.push_back(pid);
+  }
+  for (const pid_t pid : pids) {
+    int status = -1;
+    ::waitpid(pid, &status, 0);
+    EXPECT_EQ(status, 0);
+  }
+  EXPECT_EQ(open()->childGroups(2).size(), 6U);
+}
+
+TEST_F(State, AFolderThatDoesNotExistIsAReason) {
+  configuration_.statePath = "/nonexistent/kernel.db";
+  EXPECT_THAT(notUsable(), HasSubstr("/nonexistent: cannot open the folder"));
+}
+
+TEST_F(State, AFolderInItsPlaceIsAReason) {
+  std::filesystem::create_directory(path_);
+  EXPECT_THAT(notUsable(), HasSubstr("is no regular file"));
+}
+
+TEST_F(State, APathThroughAFileIsAReason) {
+  ::Test::writeFile(path_, "x");
+  configuration_.statePath = path_ + "/kernel.db";
+  EXPECT_THAT(notUsable(), HasSubstr("Not a directory"));
+}
+
+TEST_F(State, AFileThatIsNoDatabaseIsAReason) {
+  ::Test::writeFile(path_, std::string(5000, 'z'));
+  EXPECT_THAT(notUsable(), HasSubstr(path_ + ": cannot use the state: file is not a database"));
+}
+
+TEST_F(State, ADatabaseOfSomethingElseIsAReason) {
+  Platform::Database(path_, Platform::Database::Mode::kCreate, 0).execute("CREATE TABLE t (i)");
+  EXPECT_THAT(notUsable(), HasSubstr("is no state of a kernel"));
+}
+
+TEST_F(State, AnotherVersionIsAReason) {
+  { (void)open(); }
+  execute("UPDATE kernel SET version = 99");
+  EXPECT_THAT(notUsable(), HasSubstr("is a state of version 99, this library has 1"));
+}
+
+TEST_F(State, AStateWithoutItsKernelIsAReason) {
+  { (void)open(); }
+  execute("DELETE FROM kernel");
+  EXPECT_THAT(notUsable(), HasSubstr("is damaged"));
+}
+
+TEST_F(State, ATruncatedFileIsNeverACrash) {
+  {
+    const auto kernel = open();
+    for (int i = 0; i < 200; ++i) kernel->create(2, "pool" + std::to_string(i));
+  }
+  for (auto size = static_cast<int64_t>(std::filesystem::file_size(path_)) - 512; size > 0;
+       size -= 1536) {
+    ASSERT_EQ(::truncate(path_.c_str(), size), 0);
+    const Refusal refusal = refusalOf([this] {
+      const auto kernel = open();
+      for (int i = 0; i < 200; i += 7) (void)kernel->lookUp("host/opt/pool" + std::to_string(i));
+      (void)kernel->check(false);
+    });
+    EXPECT_TRUE(refusal.status == Status::kKernelNotUsable || refusal.status == Status::kNotFound ||
+                refusal.status == Status::kSuccess)
+        << refusal.reason;
+  }
+}
+
+TEST_F(State, DamageInTheMiddleIsAReasonOrAFindingButNeverACrash) {
+  {
+    const auto kernel = open();
+    for (int i = 0; i < 200; ++i) kernel->create(2, "pool" + std::to_string(i));
+  }
+  std::string bytes = ::Test::readFile(path_);
+  for (size_t at = 1024; at < bytes.size(); at += 1024) {
+    for (size_t i = 0; i < 300; ++i) bytes[at + i] = static_cast<char>(0xa5 ^ i);
+  }
+  ::Test::writeFile(path_, bytes);
+  const Refusal refusal = refusalOf([this] { (void)open()->lookUp("host/opt/pool7"); });
+  EXPECT_EQ(refusal.status, Status::kKernelNotUsable) << refusal.reason;
+}
+
+TEST_F(State, ADamagedOneIsReplacedByABootWithForceOnly) {
+  ::Test::writeFile(path_, std::string(5000, 'z'));
+  EXPECT_EQ(refusalOf([this] { boot({}, false); }).status, Status::kKernelNotUsable);
+  boot({}, true);
+  EXPECT_GT(open()->create(2, "pool"), 1000) << "ids of the lost state are not given again";
+}
+
+TEST_F(State, ABootTakesTheFactsThatItIsGiven) {
+  BootFacts facts;
+  facts.cpus = 7;
+  facts.memoryMB = 1000;
+  facts.maxVms = 3;
+  facts.isVm = !readMachineFacts().isVm;
+  facts.commandLine = "some words";
+  boot(facts, false);
+  const HostFacts booted = open()->facts();
+  EXPECT_EQ(booted.cpus, 7U);
+  EXPECT_EQ(booted.memoryKB, 1024000U);
+  EXPECT_EQ(booted.maxVms, 3U);
+  EXPECT_EQ(booted.isVm, *facts.isVm);
+  EXPECT_EQ(booted.bootCommandLine, "some words");
+}
+
+TEST_F(State, ABootRefusesFactsOfNoMachine) {
+  BootFacts facts;
+  facts.cpus = 0;
+  EXPECT_EQ(refusalOf([&] { boot(facts, true); }).status, Status::kBadParameter);
+  facts = {};
+  facts.memoryMB = 0;
+  EXPECT_EQ(refusalOf([&] { boot(facts, true); }).status, Status::kBadParameter);
+  facts.memoryMB = UINT64_MAX;
+  EXPECT_EQ(refusalOf([&] { boot(facts, true); }).status, Status::kBadParameter);
+  facts = {};
+  facts.commandLine = std::string(4096, 'c');
+  EXPECT_EQ(refusalOf([&] { boot(facts, true); }).status, Status::kBadParameter);
+  EXPECT_FALSE(std::filesystem::exists(path_));
+}
+
+TEST_F(State, AMachineOf2To63KilobytesKeepsItsMemory) {
+  BootFacts facts;
+  facts.memoryMB = uint64_t{1} << 53;
+  boot(facts, false);
+  const auto kernel = open();
+  EXPECT_EQ(kernel->facts().memoryKB, uint64_t{1} << 63);
+  setMin(*kernel, 2, int64_t{1} << 53);
+  EXPECT_EQ(kernel->memoryStatistics(2).ownReservedPeakKB, uint64_t{1} << 63);
+  EXPECT_TRUE(kernel->check(false).empty());
+}
+
+TEST_F(State, ABootOfAKernelWithGroupsNeedsForce) {
+  GroupId pool = 0;
+  {
+    const auto kernel = open();
+    pool = kernel->create(2, "pool");
+    setMin(*kernel, 2, 1);
+  }
+  const Refusal refusal = refusalOf([this] { boot({}, false); });
+  EXPECT_EQ(refusal.status, Status::kBusy);
+  EXPECT_THAT(refusal.reason, HasSubstr("1 groups"));
+  EXPECT_EQ(open()->lookUp("host/opt/pool"), pool);
+  boot({}, true);
+  EXPECT_EQ(refusalOf([this] { (void)open()->lookUp("host/opt/pool"); }).status, Status::kNotFound);
+  EXPECT_EQ(open()->readAllocation(2, Resource::kMemory).min, 0);
+  EXPECT_EQ(open()->memoryStatistics(2).ownReservedPeakKB, 0U);
+}
+
+TEST_F(State, ABootOfAKernelWithoutGroupsNeedsNoForce) {
+  { (void)open(); }
+  boot({}, false);
+  EXPECT_EQ(open()->childGroups(2).size(), 0U);
+}
+
+TEST_F(State, AnOpenKernelSeesTheBootOfAnother) {
+  const auto kernel = open();
+  kernel->create(2, "pool");
+  boot({}, true);
+  EXPECT_TRUE(kernel->childGroups(2).empty());
+}
+
+TEST_F(State, AUserWithoutRightsIsToldSo) {
+  if (::geteuid() != 0) GTEST_SKIP() << "needs root to become another user";
+  { (void)open(); }
+  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+  EXPECT_EQ(asNobody([this] {
+              const Refusal refusal = refusalOf([this] { open()->create(2, "pool"); });
+              return refusal.status == Status::kKernelNotUsable ||
+                             refusal.status == Status::kPermissionDenied
+                         ? 0
+                         : 1;
+            }),
+            0);
+  EXPECT_TRUE(open()->childGroups(2).empty());
+}
+
+class Check : public State {
+ protected:
+  Check() {
+    const auto kernel = open();
+    parent_ = kernel->create(2, "parent");
+    child_ = kernel->create(parent_, "child");
+    setMin(*kernel, child_, 10);
+  }
+
+  // What the check finds after the state was changed behind the kernel's back: exactly this, first
+  // as it is, then mended, then no more.
+  void expectFound(const char *sql, const std::string &path, const std::string &text) {
+    execute(sql);
+    for (const bool repair : {false, true}) {
+      const auto findings = open()->check(repair);
+      ASSERT_FALSE(findings.empty());
+      EXPECT_EQ(findings.front().path, path);
+      EXPECT_THAT(findings.front().text, HasSubstr(text));
+      EXPECT_EQ(findings.front().mended, repair);
+    }
+    EXPECT_TRUE(open()->check(false).empty());
+  }
+
+  GroupId parent_ = 0, child_ = 0;
+};
+
+TEST_F(Check, AGoodStateHasNoFindings) {
+  EXPECT_TRUE(open()->check(true).empty());
+}
+
+TEST_F(Check, ASumThatIsTooLargeIsFoundAndMended) {
+  expectFound("UPDATE groups SET mem_children = 50, children_peak_kb = 51200 WHERE name = 'parent'",
+              "host/opt/parent", "the children reserve 10 of memory, the group counts 50");
+}
+
+TEST_F(Check, ASumThatIsTooSmallIsFoundAndMended) {
+  expectFound("UPDATE groups SET cpu_children = -5 WHERE name = 'opt'", "host/opt",
+              "the children reserve 0 of CPU, the group counts -5");
+}
+
+TEST_F(Check, AMendedSumChangesThoseAboveIt) {
+  execute("UPDATE groups SET mem_min = 30, own_peak_kb = 30720 WHERE name = 'child'");
+  EXPECT_EQ(open()->check(true).size(), 6U) << "three sums, and three peaks below them";
+  EXPECT_TRUE(open()->check(false).empty());
+  EXPECT_EQ(open()->view(1).memoryReservationMB, 30);
+}
+
+TEST_F(Check, APeakBelowWhatIsReservedIsFoundAndMended) {
+  expectFound("UPDATE groups SET own_peak_kb = 5 WHERE name = 'child'", "host/opt/parent/child",
+              "a peak is below");
+}
+
+TEST_F(Check, AGroupThatHostDoesNotReachIsFoundAndRemoved) {
+  expectFound("INSERT INTO groups (parent, name) VALUES (999, 'lost')", "lost",
+              "has no way up to host");
+}
+
+TEST_F(Check, AMemberOfNoGroupIsFoundAndRemoved) {
+  expectFound("INSERT INTO members VALUES (1, 1, 999)", path_, "process 1 is in no group");
+}
+
+TEST_F(Check, ABrokenFileIsFoundAndNotMended) {
+  {
+    const auto kernel = open();
+    for (int i = 0; i < 100; ++i) kernel->create(parent_, "pool" + std::to_string(i));
+  }
+  execute("PRAGMA writable_schema = ON; DELETE FROM sqlite_schema WHERE name = 'members_by_group'");
+  const auto findings = open()->check(true);
+  ASSERT_EQ(findings.size(), 1U);
+  EXPECT_THAT(findings.front().text, HasSubstr("the state is damaged"));
+  EXPECT_FALSE(findings.front().mended);
+}
+
+TEST_F(Check, AViewHoldsWhatPeopleAreShown) {
+  const GroupView view = open()->view(child_);
+  EXPECT_EQ(view.id, child_);
+  EXPECT_EQ(view.name, "child");
+  EXPECT_EQ(view.memory.min, 10);
+  EXPECT_EQ(view.memoryReservationMB, 10);
+  EXPECT_EQ(view.cpuReservationPercent, 0);
+  EXPECT_EQ(view.usage.memoryBytes, 0U);
+  EXPECT_FALSE(view.usage.cpuMicroseconds);
+  EXPECT_EQ(view.deviation, "");
+  EXPECT_EQ(refusalOf([this] { (void)open()->view(999); }).status, Status::kNotFound);
+}
+
+TEST_F(Check, AViewCountsTheMemoryOfProcessesBelow) {
+  const auto kernel = open();
+  kernel->join(child_, ::getpid());
+  EXPECT_EQ(kernel->members(child_), std::vector<int64_t>{::getpid()});
+  EXPECT_GT(*kernel->view(1).usage.memoryBytes, 500000U);
+}
+
+class DefaultPlace : public testing::Test {
+ protected:
+  // Each case changes what the process is, so that it runs in one of its own.
+  int ofNobody(const std::function<void()> &prepare, const std::string &expected,
+               const std::string &reason) {
+    return asNobody([&] {
+      ::umask(022);
+      ::unsetenv("XDG_RUNTIME_DIR");
+      ::setenv("TMPDIR", folder_.path().c_str(), 1);
+      prepare();
+      std::string place;
+      const Refusal refusal = refusalOf([&] { place = defaultStatePath(); });
+      if (place == expected && refusal.reason.find(reason) != std::string::npos) return 0;
+      ::write(2, (place + refusal.reason).c_str(), (place + refusal.reason).size());
+      return 1;
+    });
+  }
+  void SetUp() override {
+    if (::geteuid() != 0) GTEST_SKIP() << "needs root to become another user";
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 01777), 0);
+  }
+  std::string own() const { return folder_.path() / "knob-65534"; }
+
+  const ::Test::TempFolder folder_;
+};
+
+TEST_F(DefaultPlace, AUserHasAPrivateFolderBelowTheTempFolder) {
+  EXPECT_EQ(ofNobody([] {}, own() + "/kernel.db", ""), 0);
+  EXPECT_EQ(ofNobody([] {}, own() + "/kernel.db", ""), 0) << "it is there already";
+  EXPECT_EQ(std::filesystem::status(own()).permissions(), std::filesystem::perms::owner_all);
+}
+
+TEST_F(DefaultPlace, TheRuntimeFolderComesFirst) {
+  const std::string runtime = folder_.path() / "runtime";
+  EXPECT_EQ(ofNobody(
+                [&] {
+                  std::filesystem::create_directory(runtime);
+                  ::setenv("XDG_RUNTIME_DIR", runtime.c_str(), 1);
+                },
+                runtime + "/knob/kernel.db", ""),
+            0);
+}
+
+TEST_F(DefaultPlace, AFolderOfSomebodyElseIsRefused) {
+  std::filesystem::create_directory(own());
+  EXPECT_EQ(ofNobody([] {}, "", own() + ": belongs to another user"), 0);
+}
+
+TEST_F(DefaultPlace, AFolderThatIsOpenToOthersIsRefused) {
+  EXPECT_EQ(ofNobody(
+                [&] {
+                  std::filesystem::create_directory(own());
+                  ::chmod(own().c_str(), 0770);
+                },
+                "", own() + ": is open to other users"),
+            0);
+}
+
+TEST_F(DefaultPlace, ALinkIsRefused) {
+  EXPECT_EQ(
+      ofNobody([&] { std::filesystem::create_symlink("/", own()); }, "", own() + ": is no folder"),
+      0);
+}
+
+TEST_F(DefaultPlace, ATempFolderThatCannotBeWrittenIsAReason) {
+  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+  EXPECT_EQ(ofNobody([] {}, "", own() + ": cannot make the folder: Permission denied"), 0);
+}
+
+}  // namespace
+}  // namespace Knob
