@@ -16,8 +16,8 @@ class HeldProcess {
 
   pid_t pid() const { return pid_; }
 
-  // Returns once the process has touched that much memory. What it held before its group was changed
-  // may be counted where it was then.
+  // Returns once the process has touched that much memory. What it held before its group was
+  // changed may be counted where it was then.
   void hold(size_t memoryMB);
 
   // Ends it, and waits until it is a zombie; its id stays taken.

@@ -133,12 +133,16 @@ GroupPtr Groups::makeHost() {
 
 GroupPtr Groups::makeIn(int parentDirectory, std::string_view name) {
   const std::string text(name);
-  if (::mkdirat(parentDirectory, text.c_str(), kDirectoryMode) != 0) {
-    fail(errno, "cannot make " + text);
-  }
   UniqueFd directory;
   Identity identity;
-  int error = openBeneath(parentDirectory, text, directory);
+  // Another process may remove the new group before it is opened; then it is made once more.
+  int error = 0;
+  do {
+    if (::mkdirat(parentDirectory, text.c_str(), kDirectoryMode) != 0) {
+      fail(errno, "cannot make " + text);
+    }
+    error = openBeneath(parentDirectory, text, directory);
+  } while (error == ENOENT);
   if (error == 0) error = identify(directory.get(), "", identity);
   if (error != 0) {
     (void)::unlinkat(parentDirectory, text.c_str(), AT_REMOVEDIR);  // the first error counts
