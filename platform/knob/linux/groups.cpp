@@ -27,6 +27,9 @@ constexpr size_t kMostGroupsOpen = 24, kGroupsKept = 8;
 constexpr size_t kMostPathsKnown = 64;
 static_assert(sizeof(ino_t) == sizeof(GroupId), "an inode number is a group's id");
 
+// A directory's own two links; each directory in it adds one.
+constexpr nlink_t kLinksOfALeaf = 2;
+
 struct DirectoryCloser {
   void operator()(DIR *directory) const { (void)::closedir(directory); }
 };
@@ -198,7 +201,7 @@ std::vector<Child> Groups::children(const Group &group) const {
 bool Groups::hasChildren(const Group &group) const {
   struct stat status {};
   if (::fstat(group.directory, &status) != 0) fail(errno, "cannot look at the group");
-  return status.st_nlink > 2;  // its own two, and one for each directory in it
+  return status.st_nlink > kLinksOfALeaf;
 }
 
 void Groups::requireAlive(const Group &group) const {
@@ -216,6 +219,13 @@ void Groups::passOn(Group &group) {
     fail(error, "cannot pass memory and cpu on below " + nameOf(group));
   }
   group.passesOn = true;
+}
+
+void Groups::takeBack(Group &group) const noexcept {
+  struct stat status {};
+  if (::fstat(group.directory, &status) != 0 || status.st_nlink > kLinksOfALeaf) return;
+  (void)writeControl(group.directory, kSubtreeFile, kTakeBack);
+  group.passesOn = false;
 }
 
 void Groups::passOnToHost() const {

@@ -77,6 +77,10 @@ class Groups {
   // processes are in one of them.
   void passOn(Group &group);
 
+  // Ends that in a group that has no child groups, so that it takes processes. Throws nothing: the
+  // next process that joins it tries again.
+  void takeBack(Group &group) const noexcept;
+
   // Opens a control file for writing, or gives the descriptor that is open already. Throws.
   int open(Group &group, Control control);
 

@@ -51,7 +51,28 @@ GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
   if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
   const GroupPtr above = groups_.find(parent);
   groups_.passOn(*above);
-  return groups_.make(*above, name)->id;
+  try {
+    const GroupPtr group = groups_.make(*above, name);
+    requireControllers(*group, *above);
+    return group->id;
+  } catch (const KernelError &) {
+    // A group that got no child still takes processes.
+    groups_.takeBack(*above);
+    throw;
+  }
+}
+
+// Another process may have taken the controllers back since this one has seen them passed on. The
+// file that is opened to see that is the one that a change of settings needs first.
+void KernelOnGroups::requireControllers(Group &group, Group &parent) {
+  try {
+    (void)groups_.open(group, Control::kMemoryMin);
+  } catch (const KernelError &error) {
+    // Removed by somebody at once; that does not undo that it was made.
+    if (error.status == Status::kNotFound) return;
+    groups_.remove(group, parent);
+    throw;
+  }
 }
 
 void KernelOnGroups::remove(GroupId id) {
@@ -65,6 +86,7 @@ void KernelOnGroups::remove(GroupId id) {
   const Held held = books_.read(*group);
   groups_.remove(*group, *parent);
   books_.releaseChild(*parent, held);
+  groups_.takeBack(*parent);
 }
 
 Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {

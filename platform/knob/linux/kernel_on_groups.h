@@ -32,6 +32,7 @@ class KernelOnGroups : public Kernel {
 
  private:
   GroupPtr host();
+  void requireControllers(Group &group, Group &parent);
 
   Groups groups_;
   const HostFacts facts_;
