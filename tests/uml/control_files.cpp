@@ -2,6 +2,7 @@
 
 #include <fcntl.h>
 #include <signal.h>
+#include <sys/xattr.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -12,6 +13,7 @@
 #include <stdexcept>
 #include <system_error>
 #include <thread>
+#include <utility>
 
 namespace Uml {
 namespace {
@@ -104,6 +106,17 @@ void removeGroups(const std::vector<std::string> &keep) {
   for (const std::string &group : groups) killMembers(group);
   for (const std::string &group : groups)
     if (std::find(keep.begin(), keep.end(), group) == keep.end()) removeWhenEmpty(group);
+}
+
+void startTreeAnew() {
+  removeGroups(kFixedGroups);
+  for (const std::string &group : kFixedGroups) {
+    if (!groupExists(group)) continue;
+    removexattr((kMount / group).c_str(), "user.knob");
+    for (const auto &[file, text] : {std::pair("memory.min", "0"), std::pair("memory.max", "max"),
+                                     std::pair("cpu.max", "max"), std::pair("cpu.weight", "100")})
+      writeControl(group, file, text);
+  }
 }
 
 }  // namespace Uml

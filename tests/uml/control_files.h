@@ -36,6 +36,11 @@ int64_t oomKills();
 // Kills what lives in groups, and removes them. keep: those that stay.
 void removeGroups(const std::vector<std::string> &keep);
 
+// Makes the fixed groups, where they are, as new as they were at first, and removes all others: for
+// a process whose libknob has the tree open. What libknob knew of the fixed ones is gone with their
+// record.
+void startTreeAnew();
+
 // The groups that are there before the first pool is.
 inline const std::vector<std::string> kFixedGroups = {"host", "host/opt"};
 

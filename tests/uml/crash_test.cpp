@@ -7,6 +7,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <iostream>
@@ -32,12 +33,20 @@ constexpr const char *kDefinition =
     "- name: a/b\n  memMin: 8\n  cpuMin: 3\n"
     "- name: a/b/x\n  mem: 6\n- name: a/b/y\n  mem: 5\n  cpuMax: 40\n"
     "- name: a/c\n  memMin: 16\n  memMinLimit: 20\n"
-    "- name: d\n  memMax: 64\n- name: d/e\n  mem: 12\n  cpuMin: 2\n- name: d/f\n  mem: 9\n"
+    "- name: d\n  memMax: 90\n- name: d/e\n  mem: 12\n  cpuMin: 2\n- name: d/f\n  mem: 30\n"
     "- name: host/g\n  memMin: 7\n  memShares: 300\n";
+
+// Enough for the kernel to take about as long as reading them.
+std::string definition() {
+  std::string text = kDefinition;
+  for (int i = 0; i < 24; ++i)
+    text += "- name: d/f/n" + std::to_string(i) + "\n  memMin: " + std::to_string(i % 3) + "\n";
+  return text;
+}
 
 class Crash : public LinuxTest {
  protected:
-  Crash() : file_(world.file("pools.yaml", kDefinition).string()) {
+  Crash() : file_(world.file("pools.yaml", definition()).string()) {
     pools_ = parseList(world.poolctl({"list", "-v", file_}).out);
   }
 
@@ -51,7 +60,8 @@ class Crash : public LinuxTest {
     const char *argv[] = {"poolctl", command.c_str(), file_.c_str(), nullptr};
     posix_spawn_file_actions_t files;
     posix_spawn_file_actions_init(&files);
-    posix_spawn_file_actions_addopen(&files, STDERR_FILENO, "/dev/null", O_WRONLY, 0);
+    for (int stream : {STDOUT_FILENO, STDERR_FILENO})
+      posix_spawn_file_actions_addopen(&files, stream, "/dev/null", O_WRONLY, 0);
     pid_t pid = -1;
     const int error = posix_spawn(&pid, program.c_str(), &files, nullptr,
                                   const_cast<char *const *>(argv), envp.data());
@@ -132,6 +142,7 @@ class Crash : public LinuxTest {
 TEST_F(Crash, AKillAtAnyMomentOfLoadAndUnloadLeavesATreeThatTheNextCanUse) {
   durationOf("load");
   durationOf("unload");
+  const microseconds reading = durationOf("list");
   const microseconds load = durationOf("load"), unload = durationOf("unload");
   std::mt19937 random(kSeed);
   int killed = 0, halfDone = 0;
@@ -140,8 +151,10 @@ TEST_F(Crash, AKillAtAnyMomentOfLoadAndUnloadLeavesATreeThatTheNextCanUse) {
     if (!loading) {
       ASSERT_TRUE(silentlyDone(world.poolctl({"load", file_})));
     }
-    const auto longest = static_cast<unsigned>((loading ? load : unload).count());
-    const microseconds moment(random() % (longest + 1));
+    // Seldom while the definitions are still read, and mostly while the kernel is at work.
+    const auto first = static_cast<unsigned>(i % 10 < 2 ? 0 : reading.count() * 3 / 4);
+    const auto last = static_cast<unsigned>((loading ? load : unload).count());
+    const microseconds moment(first + random() % (std::max(last, first) - first + 1));
     SCOPED_TRACE((loading ? "load" : "unload") + std::string(", killed after ") +
                  std::to_string(moment.count()) + " us");
     const pid_t pid = start(loading ? "load" : "unload");

@@ -30,15 +30,15 @@ class HostileNames : public testing::Test {
   }
 
   void SetUp() override {
+    startTreeAnew();
     ASSERT_EQ(lookUp("host/opt", &opt_), 0u);
-    removeGroups(kFixedGroups);
     ASSERT_EQ(create(opt_, "web", &web_), 0u);
     before_ = everythingOutside();
   }
 
   void TearDown() override {
     EXPECT_EQ(everythingOutside(), before_) << "something beside the tree has changed";
-    removeGroups(kFixedGroups);
+    startTreeAnew();
   }
 
   // The groups beside "host", and what the root of the hierarchy passes on.
@@ -227,15 +227,16 @@ TEST_F(HostileNames, ADeletedGroupsIdNamesNothingAnyMore) {
   EXPECT_EQ(numberIn("host/opt/web", "memory.min"), 0);
 }
 
-TEST_F(HostileNames, AnIdStaysWithItsGroupWhenSomebodyRenamesIt) {
-  fs::rename(kMount / "host/opt/web", kMount / "host/opt/moved");
-  EXPECT_EQ(setMemory(web_, {"min=8"}), 0u);
-  EXPECT_EQ(numberIn("host/opt/moved", "memory.min"), 8 * kMiB);
-  EXPECT_EQ(numberIn("host/opt", "memory.min"), 8 * kMiB);
-  int64_t id = -1;
-  EXPECT_EQ(lookUp("host/opt/moved", &id), 0u);
-  EXPECT_EQ(id, web_);
-  EXPECT_EQ(destroy(id), 0u);
+TEST_F(HostileNames, AGroupWhoseLastChildIsGoneTakesProcessesAgain) {
+  int64_t child = -1, other = -1;
+  ASSERT_EQ(create(web_, "child", &child), 0u);
+  ASSERT_EQ(create(opt_, "other", &other), 0u);
+  Worker worker("host/opt/other", doNothing);
+  EXPECT_EQ(join(web_, worker.pid()), kBusy);
+  ASSERT_EQ(destroy(child), 0u);
+  EXPECT_EQ(join(web_, worker.pid()), 0u);
+  EXPECT_EQ(readControl("host/opt/web", "cgroup.procs"), std::to_string(worker.pid()));
+  EXPECT_EQ(destroy(other), 0u);
 }
 
 TEST_F(HostileNames, AProcessThatIsNoneCannotJoin) {
