@@ -16,7 +16,7 @@ endforeach()
 # first with an empty entry, which makes the loader look for libraries in the current folder.
 if(NOT CMAKE_INSTALL_PREFIX STREQUAL "/usr")
   set_target_properties(${programs} PROPERTIES
-    BUILD_WITH_INSTALL_RPATH ON INSTALL_RPATH "$ORIGIN/../lib" INSTALL_RPATH_USE_LINK_PATH ON)
+    BUILD_WITH_INSTALL_RPATH ON INSTALL_RPATH "$ORIGIN/../lib;${yaml_cpp_rpath}")
   set(CMAKE_INSTALL_LIBDIR lib)
 endif()
 install(TARGETS ${programs}

@@ -10,3 +10,10 @@ else()
   target_include_directories(yaml_cpp SYSTEM INTERFACE ${YAML_CPP_INCLUDE_DIR})
   target_link_libraries(yaml_cpp INTERFACE ${YAML_CPP_LIBRARIES})
 endif()
+
+# A copy outside the system's folders must be found at run time too: the package stands in
+# LIBRARIES/cmake/yaml-cpp.
+set(yaml_cpp_rpath)
+if(NOT yaml-cpp_DIR MATCHES "^/usr/")
+  get_filename_component(yaml_cpp_rpath ${yaml-cpp_DIR}/../.. ABSOLUTE)
+endif()

@@ -20,7 +20,7 @@ namespace {
 
 constexpr const char *kDefaultFile = "/etc/kestrel.conf";
 constexpr const char *kRootStore = "/var/lib/kestrel/store.db";
-constexpr int64_t kMostTimeoutMs = 3600 * 1000;
+constexpr int64_t kMostTimeoutMs = 3600000;  // an hour
 const std::initializer_list<std::string_view> kKeys = {
     "store", "path", "endpoints", "prefix",        "cacert",
     "cert",  "key",  "user",      "password-file", "timeout-ms"};
@@ -76,7 +76,7 @@ std::vector<std::string> readEndpoints(const Platform::KeyValueFile &file) {
 }
 
 std::string readPrefix(const Platform::KeyValueFile &file, const std::string &otherwise) {
-  const std::string prefix = file.absolutePath("prefix").value_or(otherwise);
+  std::string prefix = file.absolutePath("prefix").value_or(otherwise);
   if (prefix.back() == '/') file.refuse("prefix", "bad value \"" + prefix + "\" (ends with '/')");
   return prefix;
 }

@@ -96,7 +96,7 @@ std::string writtenValue(const Value &value) {
     (void)parseAs(Type::kText, *text);  // refuses what is not UTF-8
     return quoted(*text);
   }
-  const std::string printed = print(value);
+  std::string printed = print(value);
   const auto *real = std::get_if<double>(&value);
   if (real == nullptr || std::isfinite(*real)) return printed;
   return printed[0] == '-' ? "-." + printed.substr(1) : "." + printed;

@@ -17,6 +17,11 @@ struct Configuration {
   std::string source;  // the file that was read; empty: there is none, and all is default
 };
 
+// When a kernel that is opened finds out whether it can be used: at once, or with the first call
+// that needs more than what its boot fixed. The latter saves a program that only asks for facts
+// most of its start.
+enum class Opening { kAtOnce, kWhenNeeded };
+
 // Reads the file that KNOB_CONF names, or /etc/knob.conf. That the latter is missing means
 // defaults; a file that was asked for by name must be there. Throws Platform::ConfigError.
 Configuration readConfiguration();

@@ -26,7 +26,7 @@ LiveKernel &LiveKernel::instance() {
 
 void LiveKernel::open() {
   if (kernel_) return;
-  kernel_ = openConfiguredKernel();
+  kernel_ = openConfiguredKernel(Opening::kWhenNeeded);
   static const CloseAtExit kCloseAtExit;
 }
 

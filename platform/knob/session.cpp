@@ -16,15 +16,15 @@ Configuration sessionConfiguration() {
   }
 }
 
-std::unique_ptr<Kernel> openKernel(const Configuration &configuration) {
+std::unique_ptr<Kernel> openKernel(const Configuration &configuration, Opening opening) {
   if (configuration.kernel == Configuration::KernelKind::kLinux) {
     return openLinuxKernel(configuration);
   }
-  return openEmulatedKernel(configuration);
+  return openEmulatedKernel(configuration, opening);
 }
 
-std::unique_ptr<Kernel> openConfiguredKernel() {
-  return openKernel(sessionConfiguration());
+std::unique_ptr<Kernel> openConfiguredKernel(Opening opening) {
+  return openKernel(sessionConfiguration(), opening);
 }
 
 }  // namespace Knob

@@ -21,6 +21,9 @@ namespace {
 // Deep enough for every text that somebody wrote, shallow enough for the smallest usual stack.
 constexpr int kMaxLevels = 5000;
 
+// The zero that changes nothing that it is added to: a positive one would make a -0 positive.
+constexpr float kNoAddend = -0.0F;
+
 constexpr const char *kTooDeep = "expression nested too deeply";
 
 bool isSpace(char c) {
@@ -110,7 +113,7 @@ class Reader {
 };
 
 float Reader::evaluate() {
-  const float value = ParseExpression(cursor_, 0.0F);
+  const float value = ParseExpression(cursor_, kNoAddend);
   if (*cursor_ != '\0') fail("unexpected char", cursor_);
   return value;
 }
@@ -174,7 +177,7 @@ float Reader::ParseOperand(const char *start) {
 
 float Reader::readParenthesis(const char *open) {
   cursor_ = open;
-  const float value = ParseExpression(skipSpace(open + 1), 0.0F);
+  const float value = ParseExpression(skipSpace(open + 1), kNoAddend);
   if (*cursor_ != ')') fail("expected )", cursor_);
   ++cursor_;
   return value;
@@ -228,9 +231,9 @@ float Reader::readMinMax(Word word, const char *after) {
   const char *const open = skipSpace(after);
   if (*open != '(') failExpected(name, "(", open);
   cursor_ = open;
-  const float a = ParseExpression(skipSpace(open + 1), 0.0F);
+  const float a = ParseExpression(skipSpace(open + 1), kNoAddend);
   if (*cursor_ != ',') failExpected(name, ",", cursor_);
-  const float b = ParseExpression(skipSpace(cursor_ + 1), 0.0F);
+  const float b = ParseExpression(skipSpace(cursor_ + 1), kNoAddend);
   if (*cursor_ != ')') failExpected(name, ")", cursor_);
   ++cursor_;
   const bool second = word == Word::kMin ? b < a : b > a;
@@ -241,7 +244,7 @@ float Reader::readCeil(const char *after) {
   const char *const open = skipSpace(after);
   if (*open != '(') failExpected("ceil", "(", open);
   cursor_ = open;
-  const float value = std::ceil(ParseExpression(skipSpace(open + 1), 0.0F));
+  const float value = std::ceil(ParseExpression(skipSpace(open + 1), kNoAddend));
   if (*cursor_ != ')') failExpected("ceil", ")", cursor_);
   ++cursor_;
   return value;
@@ -249,7 +252,7 @@ float Reader::readCeil(const char *after) {
 
 // "not" negates the whole expression that follows: `not x + 1` is not (x + 1).
 float Reader::readNot(const char *after) {
-  return truth(!isTrue(ParseExpression(skipSpace(after), 0.0F)));
+  return truth(!isTrue(ParseExpression(skipSpace(after), kNoAddend)));
 }
 
 // chain := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]

@@ -65,20 +65,20 @@ KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamLi
 const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status);
 
 /* Facts of the machine (get, no instance). */
-extern const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo;       /* 38 bytes */
-extern const KNOB_NodeID KNOB_NODE_system_vmLimits;            /* 32 bytes */
-extern const KNOB_NodeID KNOB_NODE_system_bootCmdLine;         /* 4096 bytes, NUL-terminated */
-extern const KNOB_NodeID KNOB_NODE_memory_comprehensive;       /* 80 bytes */
+extern const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo; /* 38 bytes */
+extern const KNOB_NodeID KNOB_NODE_system_vmLimits;      /* 32 bytes */
+extern const KNOB_NodeID KNOB_NODE_system_bootCmdLine;   /* 4096 bytes, NUL-terminated */
+extern const KNOB_NodeID KNOB_NODE_memory_comprehensive; /* 80 bytes */
 
 /* Scheduler groups. An instance is the list [group id]. */
-extern const KNOB_NodeID KNOB_NODE_sched_groupPathNameToID;    /* set: input [path], output id */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_groupCreate;   /* set: input [name], output id */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_delete;        /* set: no input, no output */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_memAllocationInMB;   /* get 36 bytes; set */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_cpuAllocationInPct;  /* get 20 bytes; set */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_members_groups;      /* instance list */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_members_worlds;      /* instance list; set: [pid] */
-extern const KNOB_NodeID KNOB_NODE_sched_groups_stats_memoryStats;   /* get 382 bytes */
+extern const KNOB_NodeID KNOB_NODE_sched_groupPathNameToID;  /* set: input [path], output id */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_groupCreate; /* set: input [name], output id */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_delete;      /* set: no input, no output */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_memAllocationInMB;  /* get 36 bytes; set */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_cpuAllocationInPct; /* get 20 bytes; set */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_members_groups;     /* instance list */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_members_worlds;     /* instance list; set: [pid] */
+extern const KNOB_NodeID KNOB_NODE_sched_groups_stats_memoryStats;  /* get 382 bytes */
 
 #ifdef __cplusplus
 }

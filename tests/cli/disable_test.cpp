@@ -77,17 +77,20 @@ TEST_F(Disable, NeedsNoDefinitions) {
   expectRun(world.poolctl({"disable", "host/opt/a"}), 0, "", "");
 }
 
-TEST_F(Disable, WithoutAWaitFailsAtTheFirstBusyAnswer) {
+class DisableOfABusyGroup : public Disable, public testing::WithParamInterface<const char *> {};
+
+TEST_P(DisableOfABusyGroup, FailsAtTheFirstAnswerWithoutAWaitAndStopsThere) {
   world.hostCalls();
-  for (const char *status : {"0x0bad0004", "0x0bad0080"}) {
-    busy(status, 1);
-    expectRun(world.poolctl({"disable", "host/opt/a", "host/opt/b"}), 1, "",
-              "host/opt/a: status 0x0bad0004\n");
-    EXPECT_EQ(retries(), 0u);
-    EXPECT_NE(world.groups().find("host/opt/a mem 0 0 0 0 "), std::string::npos);
-    EXPECT_NE(world.groups().find("host/opt/b mem 5 6 "), std::string::npos);
-  }
+  busy(GetParam(), 1);
+  expectRun(world.poolctl({"disable", "host/opt/a", "host/opt/b"}), 1, "",
+            "host/opt/a: status 0x0bad0004\n");
+  EXPECT_EQ(retries(), 0u);
+  EXPECT_NE(world.groups().find("host/opt/a mem 0 0 0 0 "), std::string::npos);
+  EXPECT_NE(world.groups().find("host/opt/b mem 5 6 "), std::string::npos);
 }
+
+INSTANTIATE_TEST_SUITE_P(Statuses, DisableOfABusyGroup,
+                         testing::Values("0x0bad0004", "0x0bad0080"));
 
 TEST_F(Disable, WaitingRepeatsAllThreeCallsEveryMillisecond) {
   world.hostCalls();

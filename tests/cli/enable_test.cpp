@@ -65,9 +65,10 @@ TEST_F(Enable, LeavesAGroupWithoutALimitAsItIs) {
 }
 
 TEST_F(Enable, RestoresNothingWhenTheDefinitionsMaximumIsZero) {
-  world.knob("group host/opt/zero min=0 max=0 shares=7");
+  world.knob("group host/opt/zero min=0 max=0 minLimit=0 shares=7");
   expectRun(world.poolctl({"enable", "host/opt/zero"}), 0, "", "");
-  EXPECT_EQ(world.groups(), treeWith("host/opt/zero mem 0 0 -1 7 cpu 0 -1 -1 -3\n"));
+  EXPECT_EQ(world.groupCalls().size(), 2u);
+  EXPECT_EQ(world.groups(), treeWith("host/opt/zero mem 0 0 0 7 cpu 0 -1 -1 -3\n"));
 }
 
 TEST_F(Enable, TakesAPoolThatIsNotEnabledByItself) {

@@ -64,11 +64,20 @@ TEST_P(CommandUsage, FollowsGetoptsComplaintForAnUnknownOption) {
             command + ": invalid option -- 'x'\n" + GetParam().text);
 }
 
-TEST_P(CommandUsage, ComesForAnUnknownOptionBehindOperandsToo) {
+TEST_P(CommandUsage, ComesForAnUnknownOptionBeforeAndBehindOperandsToo) {
   const std::string command = GetParam().command;
-  const ProcessResult result = world.poolctl({command, "operand", "-x"});
-  expectRun(result, 1, "", command + ": invalid option -- 'x'\n" + GetParam().text);
-  EXPECT_EQ(world.kernelCalls(), Calls{});
+  for (const Arguments &rest : {Arguments{"operand", "-x"}, Arguments{"-x", "operand"}}) {
+    const ProcessResult result = world.poolctl({command, rest[0], rest[1]});
+    expectRun(result, 1, "", command + ": invalid option -- 'x'\n" + GetParam().text);
+    EXPECT_EQ(world.kernelCalls(), Calls{});
+  }
+}
+
+TEST_P(CommandUsage, ComesInPlaceOfTheWorkOnOperands) {
+  for (const Arguments &rest : {Arguments{"operand", "-h"}, Arguments{"-h", "operand"}}) {
+    expectRun(world.poolctl({GetParam().command, rest[0], rest[1]}), 0, "", GetParam().text);
+    EXPECT_EQ(world.kernelCalls(), Calls{});
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(Every, CommandUsage,

@@ -2,7 +2,7 @@
 #include "knobctl/tree.h"
 
 #include <algorithm>
-#include <array>
+#include <cmath>
 
 #include "knob/status.h"
 #include "shared/text.h"
@@ -11,7 +11,7 @@ namespace Knobctl {
 
 namespace {
 
-constexpr uint64_t kBytesPerMB = 1024 * 1024;
+constexpr uint64_t kBytesPerMB = 1048576;
 constexpr uint64_t kKBPerMB = 1024;
 constexpr int64_t kBarColumns = 20;
 constexpr const char *kGreen = "\033[32m";
@@ -52,9 +52,8 @@ std::string used(const std::optional<uint64_t> &bytes) {
 std::string bar(int64_t reserved, int64_t max, int64_t machine, Look look) {
   const auto columns = [machine](int64_t amount) {
     if (machine <= 0 || amount <= 0) return int64_t{0};
-    return std::min(kBarColumns, static_cast<int64_t>(static_cast<double>(amount) * kBarColumns /
-                                                          static_cast<double>(machine) +
-                                                      0.5));
+    const double part = static_cast<double>(amount) / static_cast<double>(machine);
+    return int64_t{std::lround(std::min(part, 1.0) * static_cast<double>(kBarColumns))};
   };
   const auto filled = static_cast<size_t>(std::max(columns(reserved), int64_t{reserved > 0}));
   std::string text = std::string(filled, '#') + std::string(kBarColumns - filled, '.');

@@ -27,9 +27,15 @@ class Failure : public std::runtime_error {
 // been found right.
 using Action = std::function<ExitStatus()>;
 
+struct Tool {
+  const char *name;
+  const char *description;
+  void (*addCommands)(CLI::App &app, Action *action);  // the action lives as long as the app
+};
+
 // Parses the line, runs the action that the parsing has set and answers the exit status; a line
 // that sets none is a usage error. Help goes to standard output; output that cannot be written is a
 // failure.
-int runTool(CLI::App &app, int argc, char **argv, const Action &action);
+int runTool(const Tool &tool, int argc, char **argv) noexcept;
 
 }  // namespace Tools

@@ -1,6 +1,7 @@
 // Starts the emulated kernel: the first use does it with this machine's facts, knobctl with others.
 #include <ctime>
 
+#include "knob/emulated/boot_record.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "knob/emulated/first_use.h"
 #include "knob/emulated/schema.h"
@@ -39,25 +40,24 @@ HostFacts factsToBootWith(const BootFacts &wanted) {
   return facts;
 }
 
+BootRecord recordOf(const BootFacts &wanted) {
+  return {factsToBootWith(wanted), wanted.maxVms, buildSignature()};
+}
+
 // Leaves the tree as it is right after a boot.
-void writeBoot(Database &database, const HostFacts &facts, std::optional<uint32_t> maxVms) {
+void writeBoot(Database &database, const BootRecord &record) {
   database.execute(kEmptyTree);
-  const BuildSignature signature = buildSignature();
   Statement insert(database,
                    "INSERT INTO kernel (one, version, cpus, memory_kb, is_vm, command_line, md5, "
-                   "build_date, max_vms) VALUES (1, ?, ?, ?, ?, ?, ?, ?, ?)");
+                   "build_date) VALUES (1, ?, ?, ?, ?, ?, ?, ?)");
+  const HostFacts &facts = record.facts;
   // KB of 2^63 and more are kept as negative numbers and read back as what they were.
-  const auto memoryKB = static_cast<int64_t>(facts.memoryKB);
-  const auto write = [&](auto maxVmsOrNull) {
-    Run(insert, kStateVersion, int64_t{facts.cpus}, memoryKB, facts.isVm ? 1 : 0,
-        facts.bootCommandLine, signature.md5, signature.buildDate, maxVmsOrNull)
-        .finish();
-  };
-  if (maxVms) {
-    write(int64_t{*maxVms});
-  } else {
-    write(nullptr);
-  }
+  Run(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
+      facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
+      .finish();
+  if (!record.maxVms) return;
+  Statement setMaxVms(database, "UPDATE kernel SET max_vms = ?");
+  Run(setMaxVms, int64_t{*record.maxVms}).finish();
 }
 
 void refuseWhileGroupsExist(Database &database) {
@@ -69,14 +69,15 @@ void refuseWhileGroupsExist(Database &database) {
   }
 }
 
-void rebootState(const std::string &path, const HostFacts &facts, const BootFacts &wanted,
-                 bool force) {
+void rebootState(const std::string &path, const BootRecord &record, bool force) {
   Database database = openState(path);
   Platform::TransactionStatements statements(database);
   Platform::Transaction transaction(statements, Platform::Transaction::Kind::kWrite);
   if (!force) refuseWhileGroupsExist(database);
-  writeBoot(database, facts, wanted.maxVms);
+  removeBootRecord(path);
+  writeBoot(database, record);
   transaction.commit();
+  writeBootRecord(path, record);
 }
 
 // Ids that nobody can hold: those of the state that is lost are unknown, but they did not come
@@ -86,14 +87,23 @@ void skipLostIds(Database &database) {
   Run(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
 }
 
+void makeState(const BootLock &lock, const std::string &path, const BootRecord &record,
+               bool replacesLostOne) {
+  removeBootRecord(path);
+  buildState(lock, path, [&](Database &database) {
+    writeBoot(database, record);
+    if (replacesLostOne) skipLostIds(database);
+  });
+  writeBootRecord(path, record);
+}
+
 }  // namespace
 
 void bootOnFirstUse(const std::string &path) {
   const BootLock lock(path);
   if (stateExists(path)) return;  // another process was faster
   try {
-    buildState(lock, path,
-               [](Database &database) { writeBoot(database, factsToBootWith({}), std::nullopt); });
+    makeState(lock, path, recordOf({}), false);
   } catch (const Platform::SqliteError &error) {
     throw KernelError(Status::kKernelNotUsable,
                       path + ": cannot make the state: " + std::string(error.what()));
@@ -101,22 +111,19 @@ void bootOnFirstUse(const std::string &path) {
 }
 
 void bootEmulatedKernel(const Configuration &configuration, const BootFacts &wanted, bool force) {
-  const HostFacts facts = factsToBootWith(wanted);
+  const BootRecord record = recordOf(wanted);
   const std::string path = emulatedStatePath(configuration);
   const BootLock lock(path);
   const bool exists = stateExists(path);
   try {
-    if (exists) return rebootState(path, facts, wanted, force);
+    if (exists) return rebootState(path, record, force);
   } catch (const KernelError &error) {
     if (error.status != Status::kKernelNotUsable || !force) throw;
   } catch (const Platform::SqliteError &error) {
     if (!force) throwStateError(path, error);
   }
   try {
-    buildState(lock, path, [&](Database &database) {
-      writeBoot(database, facts, wanted.maxVms);
-      if (exists) skipLostIds(database);
-    });
+    makeState(lock, path, record, exists);
   } catch (const Platform::SqliteError &error) {
     throwStateError(path, error);
   }

@@ -13,7 +13,8 @@ namespace Knob {
 
 // Opens the state, and boots it with this machine's facts when there is none yet. Throws
 // KernelError: kernel not usable.
-std::unique_ptr<Kernel> openEmulatedKernel(const Configuration &configuration);
+std::unique_ptr<Kernel> openEmulatedKernel(const Configuration &configuration,
+                                           Opening opening = Opening::kAtOnce);
 
 // The facts to boot with; what is absent is this machine's own, and max-vms the configuration's.
 struct BootFacts {

@@ -6,6 +6,7 @@
 
 #include "knob/admission.h"
 #include "knob/allocation.h"
+#include "knob/emulated/boot_record.h"
 #include "knob/emulated/check.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "knob/emulated/first_use.h"
@@ -40,15 +41,19 @@ uint64_t residentBytesOf(const std::vector<Member> &members) {
 
 }  // namespace
 
-KernelOnState::KernelOnState(const std::string &path, uint32_t maxVms)
-    : path_(path),
-      maxVms_(maxVms),
-      database_(openState(path)),
-      transactions_(database_),
-      store_(database_) {}
+KernelOnState::State::State(const std::string &path)
+    : database(openState(path)), transactions(database), store(database) {}
+
+KernelOnState::KernelOnState(std::string path, uint32_t maxVms)
+    : path_(std::move(path)), maxVms_(maxVms) {}
+
+void KernelOnState::open() {
+  if (!state_) state_ = std::make_unique<State>(path_);
+}
 
 template <typename F>
 auto KernelOnState::alone(const F &operation) {
+  open();
   try {
     return operation();
   } catch (const Platform::SqliteError &error) {
@@ -59,7 +64,7 @@ auto KernelOnState::alone(const F &operation) {
 template <typename F>
 auto KernelOnState::transact(Kind kind, const F &operation) {
   return alone([&] {
-    Platform::Transaction transaction(transactions_, kind);
+    Platform::Transaction transaction(state_->transactions, kind);
     if constexpr (std::is_void_v<decltype(operation())>) {
       operation();
       transaction.commit();
@@ -78,7 +83,7 @@ GroupId KernelOnState::lookUp(std::string_view path) {
   const auto walk = [&] {
     GroupId id = kHostId;
     for (size_t i = 1; i < components->size(); ++i) {
-      const auto child = store_.child(id, (*components)[i]);
+      const auto child = store().child(id, (*components)[i]);
       if (!child) notFound();
       id = *child;
     }
@@ -91,12 +96,12 @@ GroupId KernelOnState::lookUp(std::string_view path) {
 GroupId KernelOnState::create(GroupId parent, std::string_view name) {
   if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
   return transact(Kind::kWrite, [&] {
-    if (!store_.exists(parent)) notFound();
-    if (store_.child(parent, name)) throw KernelError(Status::kExists);
+    if (!store().exists(parent)) notFound();
+    if (store().child(parent, name)) throw KernelError(Status::kExists);
     if (!livingMembers(parent).empty()) {
       throw KernelError(Status::kBusy, "processes are in the parent group");
     }
-    return store_.add(parent, name);
+    return store().add(parent, name);
   });
 }
 
@@ -107,12 +112,12 @@ void KernelOnState::remove(GroupId id) {
   transact(Kind::kWrite, [&] {
     const ResourceRow memory = require(id, Resource::kMemory);
     const ResourceRow cpu = require(id, Resource::kCpu);
-    if (store_.hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
+    if (store().hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
     if (!livingMembers(id).empty()) throw KernelError(Status::kBusy, "processes are in it");
     reserve(id, Resource::kMemory, memory, Allocation());
     reserve(id, Resource::kCpu, cpu, Allocation());
-    for (const Member &dead : store_.membersOf(id)) store_.removeMember(dead.pid);
-    store_.remove(id);
+    for (const Member &dead : store().membersOf(id)) store().removeMember(dead.pid);
+    store().remove(id);
   });
 }
 
@@ -128,23 +133,23 @@ void KernelOnState::setAllocation(GroupId id, Resource resource, const Allocatio
     if (resource == Resource::kMemory) {
       if (change.max && wanted.max != -1) requireMemoryFor(id, wanted.max);
       const MemoryStatistics peaks = raisedPeaks(row.peaks, wanted.min, row.level.childrenSum);
-      if (peaks.ownReservedPeakKB != row.peaks.ownReservedPeakKB) store_.writePeaks(id, peaks);
+      if (peaks.ownReservedPeakKB != row.peaks.ownReservedPeakKB) store().writePeaks(id, peaks);
     }
-    store_.writeAllocation(id, resource, wanted);
+    store().writeAllocation(id, resource, wanted);
   });
 }
 
 std::vector<GroupId> KernelOnState::childGroups(GroupId id) {
   return transact(Kind::kRead, [&] {
-    std::vector<GroupId> children = store_.children(id);
-    if (children.empty() && !store_.exists(id)) notFound();
+    std::vector<GroupId> children = store().children(id);
+    if (children.empty() && !store().exists(id)) notFound();
     return children;
   });
 }
 
 std::vector<int64_t> KernelOnState::members(GroupId id) {
   return transact(Kind::kRead, [&] {
-    if (!store_.exists(id)) notFound();
+    if (!store().exists(id)) notFound();
     std::vector<int64_t> pids;
     for (const Member &member : livingMembers(id)) pids.push_back(member.pid);
     return pids;
@@ -153,15 +158,15 @@ std::vector<int64_t> KernelOnState::members(GroupId id) {
 
 void KernelOnState::join(GroupId id, int64_t pid) {
   transact(Kind::kWrite, [&] {
-    if (!store_.exists(id)) notFound();
-    if (store_.hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
+    if (!store().exists(id)) notFound();
+    if (store().hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
     const auto started = processStart(pid);
     if (!started) throw KernelError(Status::kNotFound, "no living process of that id");
     // Here a write is due anyway, so that what is left of the dead goes with it.
-    for (const Member &member : store_.membersOf(id)) {
-      if (!lives(member)) store_.removeMember(member.pid);
+    for (const Member &member : store().membersOf(id)) {
+      if (!lives(member)) store().removeMember(member.pid);
     }
-    store_.putMember({pid, *started, id});
+    store().putMember({pid, *started, id});
   });
 }
 
@@ -170,11 +175,21 @@ MemoryStatistics KernelOnState::memoryStatistics(GroupId id) {
 }
 
 HostFacts KernelOnState::facts() {
-  return alone([&] { return store_.facts(maxVms_); });
+  if (!state_) {
+    if (const auto record = readBootRecord(path_)) {
+      HostFacts facts = record->facts;
+      facts.maxVms = record->maxVms.value_or(maxVms_);
+      return facts;
+    }
+  }
+  return alone([&] { return store().facts(maxVms_); });
 }
 
 BuildSignature KernelOnState::signature() {
-  return alone([&] { return store_.signature(); });
+  if (!state_) {
+    if (const auto record = readBootRecord(path_)) return record->signature;
+  }
+  return alone([&] { return store().signature(); });
 }
 
 GroupView KernelOnState::view(GroupId id) {
@@ -183,7 +198,7 @@ GroupView KernelOnState::view(GroupId id) {
     const Level cpu = require(id, Resource::kCpu).level;
     GroupView view;
     view.id = id;
-    view.name = store_.nameOf(id);
+    view.name = store().nameOf(id);
     view.memory = memory.allocation;
     view.cpu = cpu.allocation;
     view.memoryReservationMB = reservationOf(memory);
@@ -195,11 +210,11 @@ GroupView KernelOnState::view(GroupId id) {
 
 std::vector<Finding> KernelOnState::check(bool repair) {
   return transact(repair ? Kind::kWrite : Kind::kRead,
-                  [&] { return checkState(database_, path_, repair); });
+                  [&] { return checkState(state_->database, path_, repair); });
 }
 
 ResourceRow KernelOnState::require(GroupId id, Resource resource) {
-  const auto row = store_.read(id, resource);
+  const auto row = store().read(id, resource);
   if (!row) notFound();
   return *row;
 }
@@ -220,30 +235,30 @@ void KernelOnState::reserve(GroupId id, Resource resource, const ResourceRow &ro
     above = aboveRow.parent;
   }
 
-  const int64_t capacity = changes ? machineCapacity(store_.facts(maxVms_), resource) : 0;
+  const int64_t capacity = changes ? machineCapacity(store().facts(maxVms_), resource) : 0;
   const auto admitted = admit(levels, wanted, capacity);
   if (!admitted) throw KernelError(Status::kReservationRefused);
 
   for (size_t i = 1; i < admitted->size(); ++i) {
     const Level &level = (*admitted)[i];
-    store_.writeChildrenSum(ids[i], resource, level.childrenSum);
+    store().writeChildrenSum(ids[i], resource, level.childrenSum);
     if (resource == Resource::kMemory) {
       const auto raised = raisedPeaks(peaks[i], level.allocation.min, level.childrenSum);
       if (raised.childrenReservedPeakKB != peaks[i].childrenReservedPeakKB) {
-        store_.writePeaks(ids[i], raised);
+        store().writePeaks(ids[i], raised);
       }
     }
   }
 }
 
 std::vector<Member> KernelOnState::livingMembers(GroupId id) {
-  return onlyLiving(store_.membersOf(id));
+  return onlyLiving(store().membersOf(id));
 }
 
 std::vector<Member> KernelOnState::livingBelow(GroupId id) {
   // A group has either children or processes of its own.
-  if (!store_.hasChildren(id)) return livingMembers(id);
-  std::vector<Member> members = onlyLiving(store_.allMembers());
+  if (!store().hasChildren(id)) return livingMembers(id);
+  std::vector<Member> members = onlyLiving(store().allMembers());
   members.erase(std::remove_if(members.begin(), members.end(),
                                [&](const Member &member) { return !isBelow(member.group, id); }),
                 members.end());
@@ -251,7 +266,7 @@ std::vector<Member> KernelOnState::livingBelow(GroupId id) {
 }
 
 bool KernelOnState::isBelow(GroupId id, GroupId ancestor) {
-  while (id != 0 && id != ancestor) id = store_.parentOf(id);
+  while (id != 0 && id != ancestor) id = store().parentOf(id);
   return id == ancestor;
 }
 
@@ -267,10 +282,12 @@ std::string emulatedStatePath(const Configuration &configuration) {
   return configuration.statePath ? *configuration.statePath : defaultStatePath();
 }
 
-std::unique_ptr<Kernel> openEmulatedKernel(const Configuration &configuration) {
+std::unique_ptr<Kernel> openEmulatedKernel(const Configuration &configuration, Opening opening) {
   const std::string path = emulatedStatePath(configuration);
   if (!stateExists(path)) bootOnFirstUse(path);
-  return std::make_unique<KernelOnState>(path, configuration.maxVms);
+  auto kernel = std::make_unique<KernelOnState>(path, configuration.maxVms);
+  if (opening == Opening::kAtOnce) kernel->open();
+  return kernel;
 }
 
 }  // namespace Knob

@@ -1,6 +1,7 @@
 // The emulated kernel: the contract's operations on the rows of one state, one transaction each.
 #pragma once
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -14,7 +15,10 @@ namespace Knob {
 class KernelOnState final : public Kernel {
  public:
   // maxVms: of a kernel that was booted without a number of its own.
-  KernelOnState(const std::string &path, uint32_t maxVms);
+  KernelOnState(std::string path, uint32_t maxVms);
+
+  // Opens the state, unless it is open. Throws KernelError (kernel not usable).
+  void open();
 
   GroupId lookUp(std::string_view path) override;
   GroupId create(GroupId parent, std::string_view name) override;
@@ -49,11 +53,18 @@ class KernelOnState final : public Kernel {
   bool isBelow(GroupId id, GroupId ancestor);
   void requireMemoryFor(GroupId id, int64_t maxMB);
 
+  // Everything that an open state needs, opened with the first operation that asks for it.
+  struct State {
+    explicit State(const std::string &path);
+    Platform::Database database;
+    Platform::TransactionStatements transactions;
+    GroupStore store;
+  };
+  GroupStore &store() { return state_->store; }
+
   const std::string path_;
   const uint32_t maxVms_;
-  Platform::Database database_;
-  Platform::TransactionStatements transactions_;
-  GroupStore store_;
+  std::unique_ptr<State> state_;
 };
 
 }  // namespace Knob

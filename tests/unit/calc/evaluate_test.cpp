@@ -68,6 +68,7 @@ TEST(Evaluate, LongNamesAreLookedUpWhole) {
 
 TEST(Evaluate, CeilingOfMinusOneHalfIsMinusZero) {
   EXPECT_EQ(0.0f, Calc::Evaluate("ceil(-0.5)", {}));
+  EXPECT_TRUE(std::signbit(Calc::Evaluate("ceil(-0.5)", {})));
   EXPECT_EQ(-INFINITY, Calc::Evaluate("1 / ceil(-0.5)", {}));
 }
 

@@ -28,6 +28,7 @@ void expectValue(float expected, float actual) {
     EXPECT_TRUE(std::isnan(actual)) << "not NaN but " << actual;
   } else {
     EXPECT_EQ(expected, actual);
+    EXPECT_EQ(std::signbit(expected), std::signbit(actual)) << "the zeros differ in their sign";
   }
 }
 

@@ -9,6 +9,9 @@
 namespace Naive {
 namespace {
 
+// Added on top where there is nothing to add. A positive zero would lose the sign of -0.
+constexpr float kNothing = -0.0f;
+
 struct Fault {
   std::string message;
   std::size_t position;
@@ -32,7 +35,7 @@ class Rules {
 
   // The whole text is one expression, and nothing is left after it.
   float whole() const {
-    const Reading all = expression(0, Cursor{0, 0}, 0);
+    const Reading all = expression(0, Cursor{0, 0}, kNothing);
     if (at(all.cursor.at) != '\0') throw Fault{"unexpected char", all.cursor.at};
     return all.value;
   }
@@ -54,7 +57,7 @@ class Rules {
 
   // A pair of parentheses has a cursor of its own, which begins at the "(".
   Reading parenthesis(std::size_t start, Cursor cursor) const {
-    const Reading inner = expression(blanksAfter(start + 1), Cursor{start, 0}, 0);
+    const Reading inner = expression(blanksAfter(start + 1), Cursor{start, 0}, kNothing);
     if (at(inner.cursor.at) != ')') throw Fault{"expected )", inner.cursor.at};
     return {inner.value, Cursor{inner.cursor.at + 1, cursor.taken}};
   }
@@ -77,7 +80,7 @@ class Rules {
     if (name == "min" || name == "max") return smallerOrLarger(name, end, cursor);
     if (name == "ceil") return ceiling(end, cursor);
     if (name == "not") {
-      const Reading all = expression(blanksAfter(end), cursor, 0);
+      const Reading all = expression(blanksAfter(end), cursor, kNothing);
       return {all.value == 0 ? 1.0f : 0.0f, all.cursor};
     }
     if (name == "True") return {1, cursor};
@@ -89,10 +92,10 @@ class Rules {
   Reading smallerOrLarger(const std::string &name, std::size_t end, Cursor cursor) const {
     const std::size_t open = blanksAfter(end);
     if (at(open) != '(') throw Fault{name + " expected (", open};
-    const Reading first = expression(blanksAfter(open + 1), Cursor{open, 0}, 0);
+    const Reading first = expression(blanksAfter(open + 1), Cursor{open, 0}, kNothing);
     const std::size_t comma = first.cursor.at;
     if (at(comma) != ',') throw Fault{name + " expected ,", comma};
-    const Reading second = expression(blanksAfter(comma + 1), first.cursor, 0);
+    const Reading second = expression(blanksAfter(comma + 1), first.cursor, kNothing);
     const std::size_t close = second.cursor.at;
     if (at(close) != ')') throw Fault{name + " expected )", close};
     const bool secondWins = name == "min" ? second.value < first.value : second.value > first.value;
@@ -102,7 +105,7 @@ class Rules {
   Reading ceiling(std::size_t end, Cursor cursor) const {
     const std::size_t open = blanksAfter(end);
     if (at(open) != '(') throw Fault{"ceil expected (", open};
-    const Reading inner = expression(blanksAfter(open + 1), Cursor{open, 0}, 0);
+    const Reading inner = expression(blanksAfter(open + 1), Cursor{open, 0}, kNothing);
     if (at(inner.cursor.at) != ')') throw Fault{"ceil expected )", inner.cursor.at};
     return {std::ceil(inner.value), Cursor{inner.cursor.at + 1, cursor.taken}};
   }

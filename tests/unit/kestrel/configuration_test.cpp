@@ -99,6 +99,13 @@ TEST_F(ConfigurationFile, ThatIsNamedButMissingIsAnError) {
   EXPECT_THAT(failureOf([] { readConfiguration(); }), StartsWith(file("nowhere.conf")));
 }
 
+TEST_F(ConfigurationFile, AnEmptyVariableNamesNoFile) {
+  setenv("KESTREL_CONF", "", 1);
+  EXPECT_EQ(configurationFile(), "/etc/kestrel.conf");
+  unsetenv("KESTREL_CONF");
+  EXPECT_EQ(configurationFile(), "/etc/kestrel.conf");
+}
+
 TEST_F(ConfigurationFile, ThatCannotBeReadIsAnError) {
   setenv("KESTREL_CONF", folder_.path().c_str(), 1);
   EXPECT_THAT(failureOf([] { readConfiguration(); }), StartsWith(folder_.path().string()));
@@ -132,7 +139,7 @@ std::string defaultPathOfUser(uid_t user, const std::string &dataHome) {
 TEST_F(ConfigurationFile, TheDefaultStoreOfRootIsTheHosts) {
   if (geteuid() != 0) GTEST_SKIP() << "not root";
   configure("");
-  EXPECT_EQ(defaultPathOfUser(0, "/data"), "/var/lib/kestrel/store.db");
+  EXPECT_EQ(readConfiguration().path, "/var/lib/kestrel/store.db");
 }
 
 TEST_F(ConfigurationFile, TheDefaultStoreOfOthersIsTheirOwn) {

@@ -111,7 +111,9 @@ TEST(Exchange, EveryCodePointComesBackInTextsAndNames) {
     block += utf8(point);
     if (block.size() < 16384 && point != 0x10FFFF) continue;
     ASSERT_EQ(readBack(block), Value(block)) << "up to " << point;
-    if (point > 0x8000) {
+    if (point < 0x4000 || point > 0x10F000) {
+      // Names are written and read as texts are, but hold no NUL.
+      block.erase(0, block.find_first_not_of('\0'));
       const std::vector<StoredObject> named = {{{block, block, block, block}, {{block, 0.5}}}};
       const auto back = readExchange(writeExchange(named), "F");
       ASSERT_EQ(back.at(0).id.key, block);

@@ -244,6 +244,24 @@ TEST_F(SqliteStore, AnInspectionTellsAMissingStoreFromABadOne) {
   EXPECT_THAT(report.problem, HasSubstr("kestrel.conf:1:"));
 }
 
+TEST_F(SqliteStore, AnInspectionOfAnotherEngineNamesItsAddresses) {
+  configure("store = etcd\nendpoints = http://a:1, http://b:2\n");
+  const Report report = inspect();
+  EXPECT_EQ(report.condition, Condition::kUnusable);
+  EXPECT_THAT(report.details, ::testing::Contains(Detail("place", "http://a:1, http://b:2")));
+  EXPECT_THAT(report.problem, HasSubstr("no etcd module"));
+}
+
+TEST_F(SqliteStore, AStoreOfAnotherStateIsNoLongerCurrent) {
+  put("x", int64_t{1});
+  const auto backend = openBackend(Access::kRead);
+  EXPECT_TRUE(backend->current());
+  put("x", int64_t{2});
+  EXPECT_TRUE(backend->current());
+  std::filesystem::rename(path(), file("old.db"));
+  EXPECT_FALSE(backend->current());
+}
+
 TEST(ObjectNames, AreUtf8WithoutNul) {
   EXPECT_NO_THROW(checkId({"", "", "", ""}));
   EXPECT_NO_THROW(checkId({"a/b", "%", " ", "\xc3\xbc"}));

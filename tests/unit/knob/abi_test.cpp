@@ -4,6 +4,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 #include <new>
 
@@ -165,6 +166,7 @@ class Signature : public Abi {
     LiveKernel::instance().close();
     Platform::Database(state_, Platform::Database::Mode::kReadWrite, 0)
         .execute("UPDATE kernel SET md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
+    ASSERT_TRUE(std::filesystem::remove(state_ + "-facts"));
   }
 };
 

@@ -320,7 +320,7 @@ TEST(PoolItem, ThatIsNoMappingIsReportedAtTheItem) {
     expectError<Loader::Exception>([&] { ResourcePoolImpl made(list[i + 1]); }, places[i], message);
   }
   expectErrorAnywhere<Loader::Exception>(
-      [] { ResourcePoolImpl made(YAML::Node(YAML::NodeType::Undefined)); }, message);
+      [] { ResourcePoolImpl made{YAML::Node(YAML::NodeType::Undefined)}; }, message);
 }
 
 TEST(PoolItem, ThatIsInvalidIsTheLibrarysPlainError) {
