@@ -38,4 +38,7 @@ struct Tool {
 // failure.
 int runTool(const Tool &tool, int argc, char **argv) noexcept;
 
+// The same for a tool without sub-commands, whose words APP fills.
+int runTool(CLI::App &app, int argc, char **argv, const Action &action);
+
 }  // namespace Tools
