@@ -104,7 +104,20 @@ Held Bookkeeper::read(Group &group) const {
 }
 
 void Bookkeeper::change(Group &group, Resource resource, const AllocationChange &change) {
-  Held held = requireReadable(read(group));
+  if (group.isFresh && !areEqual(changedAllocation({}, change), {})) {
+    // Most likely nobody has set anything of it yet, so its record is not looked for: making one
+    // fails when there is one. Only if this succeeds was it right.
+    try {
+      return changeHeld(group, {}, resource, change);
+    } catch (const KernelError &) {
+      group.isFresh = false;
+    }
+  }
+  changeHeld(group, requireReadable(read(group)), resource, change);
+}
+
+void Bookkeeper::changeHeld(Group &group, Held held, Resource resource,
+                            const AllocationChange &change) {
   const Allocation current = held.record.books(resource).allocation;
   const Allocation wanted = changedAllocation(current, change);
   if (held.record.savedHigh) restoreMemoryHigh(group, held.record);
@@ -135,7 +148,7 @@ void Bookkeeper::apply(Group &group, const Held &held, Resource resource,
 
   Writes writes(groups_);
   if (resource == Resource::kMemory && isLower(wanted.max, books.allocation.max)) {
-    makeRoomBelow(group, held, wanted.max, writes);
+    makeRoomBelow(groups_, group, held, wanted.max, writes);
   }
   if (after < before) writeOwn(writes, group, held, resource, wanted);
   writeSums(writes, above, resource, levels);

@@ -47,6 +47,7 @@ class Bookkeeper {
 
  private:
   struct Place;
+  void changeHeld(Group &group, Held held, Resource resource, const AllocationChange &change);
   // A group that somebody else gave a minimum, and that now gets a record, is one more reservation:
   // whether it was, and is counted now.
   bool count(Group &group, const Held &held);

@@ -138,7 +138,7 @@ class Checker {
     try {
       Writes writes(groups_);
       if (deviation.control == Control::kMemoryMax) {
-        makeRoomBelow(group, {record, true, false}, record.memory.allocation.max, writes);
+        makeRoomBelow(groups_, group, {record, true, false}, record.memory.allocation.max, writes);
       }
       writes.control(group, deviation.control, deviation.actual.value_or(""), deviation.expected);
       writes.commit();

@@ -86,8 +86,9 @@ std::optional<std::string> readAttribute(int directory, const char *name) {
   fail(errno, std::string("cannot read the attribute ") + name);
 }
 
-void writeAttribute(int directory, const char *name, std::string_view value) {
-  if (::fsetxattr(directory, name, value.data(), value.size(), 0) == 0) return;
+void writeAttribute(int directory, const char *name, std::string_view value, Attribute kind) {
+  const int flags = kind == Attribute::kNew ? XATTR_CREATE : 0;
+  if (::fsetxattr(directory, name, value.data(), value.size(), flags) == 0) return;
   const int error = errno;
   if (error == EOPNOTSUPP) {
     fail(Status::kKernelNotUsable, error,

@@ -56,8 +56,10 @@ std::optional<std::string> readControlIfAny(int directory, const char *name);
 // An extended attribute of the directory; nothing when it has none. Throws KernelError.
 std::optional<std::string> readAttribute(int directory, const char *name);
 
-// Throw KernelError.
-void writeAttribute(int directory, const char *name, std::string_view value);
+// Throw KernelError; for kNew: exists, when the directory has such an attribute already.
+enum class Attribute { kNew, kAny };
+void writeAttribute(int directory, const char *name, std::string_view value,
+                    Attribute kind = Attribute::kAny);
 void removeAttribute(int directory, const char *name);
 
 }  // namespace Knob::Linux

@@ -12,6 +12,7 @@
 #include <utility>
 
 #include "knob/linux/beneath.h"
+#include "knob/linux/control_values.h"
 #include "knob/linux/errno_status.h"
 #include "knob/names.h"
 
@@ -79,14 +80,36 @@ GroupPtr Groups::lookUp(std::string_view path) {
   if (const int failure = identify(directory.get(), "", identity); failure != 0) {
     fail(failure, "cannot tell the id of " + text);
   }
+  if (path == kRootName) {
+    takeHost(identity.id);
+  } else if (!host()) {
+    return {};
+  }
   if (path.size() < PATH_MAX) {
     if (paths_.size() >= kMostPathsKnown) paths_.clear();
     paths_[text] = identity.id;
   }
-  if (path == kRootName) hostId_ = identity.id;
   const GroupPtr group = adopt(std::move(directory), identity.id);
   group->name = path.substr(path.rfind('/') + 1);
   return group;
+}
+
+// Host cannot go while a group lives below it. So whatever was opened while it was this one is
+// either still below it, or gone itself; it is looked at only when something new is opened.
+GroupPtr Groups::host() {
+  return lookUp(kRootName);
+}
+
+void Groups::takeHost(GroupId id) {
+  if (id == hostId_) return;
+  groups_.clear();
+  paths_.clear();
+  hostId_ = id;
+}
+
+GroupPtr Groups::openHost() {
+  if (const auto open = groups_.find(hostId_); open != groups_.end()) return open->second;
+  return host();
 }
 
 GroupPtr Groups::find(GroupId id) {
@@ -129,9 +152,8 @@ GroupPtr Groups::make(Group &parent, std::string_view name) {
 
 GroupPtr Groups::makeHost() {
   passOnToHost();
-  const GroupPtr host = makeIn(hierarchy_.directory.get(), kRootName);
-  hostId_ = host->id;
-  return host;
+  (void)makeIn(hierarchy_.directory.get(), kRootName);
+  return host();
 }
 
 GroupPtr Groups::makeIn(int parentDirectory, std::string_view name) {
@@ -208,6 +230,18 @@ void Groups::requireAlive(const Group &group) const {
   if (::faccessat(group.directory, kMembersFile, F_OK, 0) != 0) notFound();
 }
 
+bool Groups::isPopulated(Group &group) {
+  if (group.events < 0) {
+    UniqueFd file(::openat(group.directory, kEventsFile, O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
+    if (!file) fail(errno, std::string("cannot open ") + kEventsFile + " of " + nameOf(group));
+    group.events = keep(group, std::move(file));
+  }
+  std::array<char, 128> text;  // two short lines
+  const ssize_t size = ::pread(group.events, text.data(), text.size(), 0);
+  if (size < 0) fail(errno, std::string("cannot read ") + kEventsFile + " of " + nameOf(group));
+  return keyedValue({text.data(), static_cast<size_t>(size)}, "populated").value_or(1) != 0;
+}
+
 void Groups::passOn(Group &group) {
   if (group.passesOn) return;
   if (const GroupPtr parent = parentOf(group)) {
@@ -280,8 +314,7 @@ GroupPtr Groups::adopt(UniqueFd directory, GroupId id) {
 
 // An id is known to the whole machine; only what is below host is ours.
 GroupPtr Groups::findUpwards(UniqueFd directory, GroupId id) {
-  // Somebody may have removed host, and another process made it again.
-  if (!lookUp(kRootName)) notFound();
+  if (!host()) notFound();
   const GroupPtr group = adopt(std::move(directory), id);
   try {
     for (GroupPtr at = group; at->id != hostId_; at = parentOf(*at)) {
@@ -316,7 +349,7 @@ GroupPtr Groups::findByWalking(GroupId id) {
 }
 
 GroupId Groups::hostId() {
-  if (hostId_ == 0 && !lookUp(kRootName)) notFound();
+  if (hostId_ == 0 && !host()) notFound();
   return hostId_;
 }
 

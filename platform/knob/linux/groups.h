@@ -26,6 +26,7 @@ struct Group {
   std::string name;    // empty: not looked at yet
   int directory = -1;
   std::array<int, kControls.size()> controls = {-1, -1, -1, -1};  // opened for writing
+  int events = -1;        // cgroup.events, opened for reading
   bool isFresh = false;   // this process made it, and nobody has set anything of it
   bool passesOn = false;  // this process has seen to it that children get their controllers
   uint64_t lastUse = 0;
@@ -46,6 +47,12 @@ class Groups {
 
   // The group at a path of good names; empty when there is none. Throws KernelError.
   GroupPtr lookUp(std::string_view path);
+
+  // The group host as it is now; empty when there is none. Throws KernelError.
+  GroupPtr host();
+
+  // The host of the groups that are open. Empty when there is none. Throws KernelError.
+  GroupPtr openHost();
 
   // The group of an id, which must be host or below it. Throws KernelError (not found).
   GroupPtr find(GroupId id);
@@ -73,6 +80,9 @@ class Groups {
   // Throws KernelError (not found) when the group was deleted.
   void requireAlive(const Group &group) const;
 
+  // Whether living processes are in the group or below it. Throws KernelError.
+  bool isPopulated(Group &group);
+
   // Makes this group and all above it pass the controllers on. Throws KernelError: busy, when
   // processes are in one of them.
   void passOn(Group &group);
@@ -96,6 +106,7 @@ class Groups {
   GroupPtr findUpwards(Platform::UniqueFd directory, GroupId id);
   GroupPtr findByWalking(GroupId id);
   GroupId hostId();
+  void takeHost(GroupId id);
   void makeRoom();
 
   Hierarchy hierarchy_;

@@ -162,6 +162,7 @@ GroupView KernelOnGroups::view(GroupId id) {
 }
 
 std::vector<Finding> KernelOnGroups::check(bool repair) {
+  makeFixedGroups(groups_);
   const GroupPtr top = host();
   const TreeLock lock(top->directory,
                       repair ? TreeLock::Kind::kExclusive : TreeLock::Kind::kShared);
@@ -170,9 +171,9 @@ std::vector<Finding> KernelOnGroups::check(bool repair) {
 
 // Every id that a caller can have came from a look-up below it, so it is there.
 GroupPtr KernelOnGroups::host() {
-  if (const GroupPtr group = groups_.lookUp(kRootName)) return group;
+  if (const GroupPtr group = groups_.openHost()) return group;
   makeFixedGroups(groups_);
-  if (const GroupPtr group = groups_.lookUp(kRootName)) return group;
+  if (const GroupPtr group = groups_.host()) return group;
   notFound();
 }
 

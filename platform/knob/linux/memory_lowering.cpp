@@ -82,12 +82,8 @@ void askToReclaim(const Group &group, uint64_t bytes) {
 
 }  // namespace
 
-bool isPopulated(const Group &group) {
-  return keyedValue(readControl(group.directory, kEventsFile), "populated").value_or(1) != 0;
-}
-
-void makeRoomBelow(Group &group, const Held &held, int64_t maxMB, Writes &writes) {
-  if (!isPopulated(group)) return;
+void makeRoomBelow(Groups &groups, Group &group, const Held &held, int64_t maxMB, Writes &writes) {
+  if (!groups.isPopulated(group)) return;
   const std::string before = readControl(group.directory, rowOf(Control::kMemoryMax).name);
   const std::string after = memoryText(maxMB);
   const uint64_t limit = parseLimit(after).value_or(kUnlimited);

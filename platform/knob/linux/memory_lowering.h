@@ -7,13 +7,10 @@
 
 namespace Knob::Linux {
 
-// Whether living processes are in the group or below it.
-bool isPopulated(const Group &group);
-
 // Comes before memory.max is lowered. Without living processes there is nothing to do; with them it
 // is lowered here, and only when what they hold, after the kernel was asked to reclaim, fits.
 // Throws KernelError: memory busy, and nothing has changed.
-void makeRoomBelow(Group &group, const Held &held, int64_t maxMB, Writes &writes);
+void makeRoomBelow(Groups &groups, Group &group, const Held &held, int64_t maxMB, Writes &writes);
 
 // Puts memory.high back where a process died that had lowered it, and takes that from the record.
 void restoreMemoryHigh(Group &group, Record &record);

@@ -16,11 +16,12 @@ Writes::~Writes() {
 
 void Writes::record(Group &group, const Record *before, const Record &after) {
   if (before == nullptr) {
+    writeRecord(group, after, Attribute::kNew);
     undo_.emplace_back([&group] { removeAttribute(group.directory, kRecordAttribute); });
   } else {
     undo_.emplace_back([&group, old = *before] { writeRecord(group, old); });
+    writeRecord(group, after);
   }
-  writeRecord(group, after);
 }
 
 void Writes::control(Group &group, Control control, const std::string &before,
@@ -30,9 +31,9 @@ void Writes::control(Group &group, Control control, const std::string &before,
   groups_.write(group, control, after);
 }
 
-void writeRecord(Group &group, const Record &record) {
+void writeRecord(Group &group, const Record &record, Attribute kind) {
   const RecordBytes bytes = encode(record);
-  writeAttribute(group.directory, kRecordAttribute, {bytes.data(), bytes.size()});
+  writeAttribute(group.directory, kRecordAttribute, {bytes.data(), bytes.size()}, kind);
   group.isFresh = false;
 }
 

@@ -18,7 +18,7 @@ class Writes {
   Writes(const Writes &) = delete;
   Writes &operator=(const Writes &) = delete;
 
-  // before: absent where there was none. Throw KernelError.
+  // before: absent where there was none. Throw KernelError (exists, when there is one after all).
   void record(Group &group, const Record *before, const Record &after);
   void control(Group &group, Control control, const std::string &before, const std::string &after);
 
@@ -33,7 +33,7 @@ class Writes {
   std::vector<std::function<void()>> undo_;
 };
 
-// Writes a group's record. Throws KernelError.
-void writeRecord(Group &group, const Record &record);
+// Writes a group's record. Throws KernelError; for kNew: exists, when it has one already.
+void writeRecord(Group &group, const Record &record, Attribute kind = Attribute::kAny);
 
 }  // namespace Knob::Linux
