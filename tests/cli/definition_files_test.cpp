@@ -115,6 +115,8 @@ TEST_F(DefinitionFiles, ThatAreFoldersAreErrorsOfTheFile) {
   const fs::path path = world.folder() / "folder";
   fs::create_directory(path);
   setInstalledMark(path);
+  // The yaml library loses the buffer of a stream that throws while it is opened.
+  world.environment["ASAN_OPTIONS"] += ":detect_leaks=0";
   const ProcessResult result = world.poolctl({"list", "-v", path});
   EXPECT_EQ(result.status, 1);
   EXPECT_EQ(result.err.substr(0, path.string().size() + 2), path.string() + ": ");

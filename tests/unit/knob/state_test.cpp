@@ -34,17 +34,23 @@ Refusal refusalOf(const std::function<void()> &call) {
   return {Status::kSuccess, ""};
 }
 
-// What the call ends with in a process of another user; -1: it did not end by itself.
-int asNobody(const std::function<int()> &call) {
-  const pid_t pid = ::fork();
-  if (pid == 0) {
-    if (::setgid(65534) != 0 || ::setuid(65534) != 0) ::_exit(99);
-    ::_exit(call());
+// Makes the process another user's for a while.
+class AsNobody {
+ public:
+  AsNobody() {
+    EXPECT_EQ(::setegid(kNobody), 0);
+    EXPECT_EQ(::seteuid(kNobody), 0);
   }
-  int status = 0;
-  if (::waitpid(pid, &status, 0) != pid || !WIFEXITED(status)) return -1;
-  return WEXITSTATUS(status);
-}
+  AsNobody(const AsNobody &) = delete;
+  AsNobody &operator=(const AsNobody &) = delete;
+  ~AsNobody() {
+    EXPECT_EQ(::seteuid(0), 0);
+    EXPECT_EQ(::setegid(0), 0);
+  }
+
+ private:
+  static constexpr uid_t kNobody = 65534;
+};
 
 class State : public testing::Test {
  protected:
@@ -299,14 +305,11 @@ TEST_F(State, AUserWithoutRightsIsToldSo) {
   if (::geteuid() != 0) GTEST_SKIP() << "needs root to become another user";
   { (void)open(); }
   ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-  EXPECT_EQ(asNobody([this] {
-              const Refusal refusal = refusalOf([this] { open()->create(2, "pool"); });
-              return refusal.status == Status::kKernelNotUsable ||
-                             refusal.status == Status::kPermissionDenied
-                         ? 0
-                         : 1;
-            }),
-            0);
+  {
+    const AsNobody user;
+    const Status status = refusalOf([this] { open()->create(2, "pool"); }).status;
+    EXPECT_TRUE(status == Status::kKernelNotUsable || status == Status::kPermissionDenied);
+  }
   EXPECT_TRUE(open()->childGroups(2).empty());
 }
 
@@ -405,71 +408,70 @@ TEST_F(Check, AViewCountsTheMemoryOfProcessesBelow) {
 
 class DefaultPlace : public testing::Test {
  protected:
-  // Each case changes what the process is, so that it runs in one of its own.
-  int ofNobody(const std::function<void()> &prepare, const std::string &expected,
-               const std::string &reason) {
-    return asNobody([&] {
-      ::umask(022);
-      ::unsetenv("XDG_RUNTIME_DIR");
-      ::setenv("TMPDIR", folder_.path().c_str(), 1);
-      prepare();
-      std::string place;
-      const Refusal refusal = refusalOf([&] { place = defaultStatePath(); });
-      if (place == expected && refusal.reason.find(reason) != std::string::npos) return 0;
-      ::write(2, (place + refusal.reason).c_str(), (place + refusal.reason).size());
-      return 1;
-    });
+  // The place that a user has, after what the case prepares as that user; or why there is none.
+  std::string placeOfNobody(const std::function<void()> &prepare) {
+    ::umask(022);
+    ::unsetenv("XDG_RUNTIME_DIR");
+    ::setenv("TMPDIR", folder_.path().c_str(), 1);
+    const AsNobody user;
+    prepare();
+    std::string place;
+    const Refusal refusal = refusalOf([&] { place = defaultStatePath(); });
+    return refusal.status == Status::kSuccess ? place : refusal.reason;
   }
   void SetUp() override {
     if (::geteuid() != 0) GTEST_SKIP() << "needs root to become another user";
     ASSERT_EQ(::chmod(folder_.path().c_str(), 01777), 0);
   }
+  void TearDown() override {
+    if (temporary_.empty()) {
+      ::unsetenv("TMPDIR");
+    } else {
+      ::setenv("TMPDIR", temporary_.c_str(), 1);
+    }
+  }
   std::string own() const { return folder_.path() / "knob-65534"; }
 
+  const std::string temporary_ = ::getenv("TMPDIR") != nullptr ? ::getenv("TMPDIR") : "";
   const ::Test::TempFolder folder_;
 };
 
 TEST_F(DefaultPlace, AUserHasAPrivateFolderBelowTheTempFolder) {
-  EXPECT_EQ(ofNobody([] {}, own() + "/kernel.db", ""), 0);
-  EXPECT_EQ(ofNobody([] {}, own() + "/kernel.db", ""), 0) << "it is there already";
+  EXPECT_EQ(placeOfNobody([] {}), own() + "/kernel.db");
+  EXPECT_EQ(placeOfNobody([] {}), own() + "/kernel.db") << "it is there already";
   EXPECT_EQ(std::filesystem::status(own()).permissions(), std::filesystem::perms::owner_all);
 }
 
 TEST_F(DefaultPlace, TheRuntimeFolderComesFirst) {
   const std::string runtime = folder_.path() / "runtime";
-  EXPECT_EQ(ofNobody(
-                [&] {
-                  std::filesystem::create_directory(runtime);
-                  ::setenv("XDG_RUNTIME_DIR", runtime.c_str(), 1);
-                },
-                runtime + "/knob/kernel.db", ""),
-            0);
+  EXPECT_EQ(placeOfNobody([&] {
+              std::filesystem::create_directory(runtime);
+              ::setenv("XDG_RUNTIME_DIR", runtime.c_str(), 1);
+            }),
+            runtime + "/knob/kernel.db");
 }
 
 TEST_F(DefaultPlace, AFolderOfSomebodyElseIsRefused) {
   std::filesystem::create_directory(own());
-  EXPECT_EQ(ofNobody([] {}, "", own() + ": belongs to another user"), 0);
+  EXPECT_EQ(placeOfNobody([] {}), own() + ": belongs to another user");
 }
 
 TEST_F(DefaultPlace, AFolderThatIsOpenToOthersIsRefused) {
-  EXPECT_EQ(ofNobody(
-                [&] {
-                  std::filesystem::create_directory(own());
-                  ::chmod(own().c_str(), 0770);
-                },
-                "", own() + ": is open to other users"),
-            0);
+  EXPECT_THAT(placeOfNobody([&] {
+                std::filesystem::create_directory(own());
+                ::chmod(own().c_str(), 0770);
+              }),
+              HasSubstr(own() + ": is open to other users"));
 }
 
 TEST_F(DefaultPlace, ALinkIsRefused) {
-  EXPECT_EQ(
-      ofNobody([&] { std::filesystem::create_symlink("/", own()); }, "", own() + ": is no folder"),
-      0);
+  EXPECT_EQ(placeOfNobody([&] { std::filesystem::create_symlink("/", own()); }),
+            own() + ": is no folder");
 }
 
 TEST_F(DefaultPlace, ATempFolderThatCannotBeWrittenIsAReason) {
   ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-  EXPECT_EQ(ofNobody([] {}, "", own() + ": cannot make the folder: Permission denied"), 0);
+  EXPECT_EQ(placeOfNobody([] {}), own() + ": cannot make the folder: Permission denied");
 }
 
 }  // namespace
