@@ -61,6 +61,15 @@ TEST_F(ExecInPool, APoolWithPoolsBelowTakesNoProcesses) {
   EXPECT_EQ(exec({"a/b", "--", "true"}).status, 0);
 }
 
+TEST_F(ExecInPool, ADisabledPoolTakesNoProcessesAndKillsNone) {
+  ASSERT_TRUE(silentlyDone(load("- name: web\n")));
+  ASSERT_TRUE(silentlyDone(world.poolctl({"disable", "-n", "host/opt/web"})));
+  const ::Test::ProcessResult result = exec({"web", "--", "true"});
+  EXPECT_EQ(result.status, 125);
+  EXPECT_EQ(result.err, "poolctl-exec: host/opt/web: the pool is disabled\n");
+  EXPECT_EQ(oomKills(), 0);
+}
+
 TEST_F(ExecInPool, APoolThatIsNotLoadedIsSaidSo) {
   const ::Test::ProcessResult result = exec({"none", "--", "true"});
   EXPECT_EQ(result.status, 125);

@@ -2,7 +2,9 @@
 
 #include <unistd.h>
 
+#include <array>
 #include <cstdint>
+#include <cstring>
 #include <stdexcept>
 
 #include "platform/knob.h"
@@ -30,6 +32,32 @@ int64_t lookUp(const std::string &path) {
   return id;
 }
 
+int64_t memoryMaxMB(const std::string &path) {
+  constexpr size_t kRecordSize = 36, kMaxOffset = 8;
+  const int64_t id = lookUp(path);
+  const ParamList instance(ParamList::Kind::kInstance, 1);
+  KNOB_ReturnStatus status = KNOB_ParamListAddInt(instance.get(), id);
+  std::array<char, kRecordSize> record{};
+  if (status == 0) {
+    status = KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance.get(), record.data(),
+                      record.size());
+  }
+  if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
+  int64_t max = 0;
+  std::memcpy(&max, record.data() + kMaxOffset, sizeof max);
+  return max;
+}
+
+// A process in a group that may have no memory is killed as soon as it needs any, without a word.
+void requireMemory(const std::string &path) {
+  for (size_t end = path.find('/'); end != std::string::npos; end = path.find('/', end + 1)) {
+    const std::string above = path.substr(0, end);
+    if (memoryMaxMB(above) == 0)
+      refuse(path, ("disabled: " + above + " may have no memory").c_str());
+  }
+  if (memoryMaxMB(path) == 0) refuse(path, "the pool is disabled");
+}
+
 }  // namespace
 
 std::string groupPath(const std::string &pool) {
@@ -38,6 +66,7 @@ std::string groupPath(const std::string &pool) {
 
 void joinGroup(const std::string &path) {
   const int64_t id = lookUp(path);
+  requireMemory(path);
   const ParamList instance(ParamList::Kind::kInstance, 1);
   const ParamList input(ParamList::Kind::kInput, 1);
   KNOB_ReturnStatus status = KNOB_ParamListAddInt(instance.get(), id);

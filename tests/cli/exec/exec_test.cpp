@@ -123,6 +123,19 @@ TEST_F(Exec, APoolWithPoolsBelowTakesNoProcesses) {
                    "processes itself\n");
 }
 
+TEST_F(Exec, ADisabledPoolTakesNoProcesses) {
+  ASSERT_EQ(world.poolctl({"disable", "-n", "host/opt/web"}).status, 0);
+  expectOwnFailure({"web", "--", "/bin/sh", "-c", "echo ran"},
+                   "poolctl-exec: host/opt/web: the pool is disabled\n");
+}
+
+TEST_F(Exec, NorDoesOneBelowADisabledPool) {
+  ASSERT_EQ(world.poolctl({"disable", "-n", "host/opt/parent"}).status, 0);
+  expectOwnFailure(
+      {"parent/below", "--", "/bin/sh", "-c", "echo ran"},
+      "poolctl-exec: host/opt/parent/below: disabled: host/opt/parent may have no memory\n");
+}
+
 TEST_F(Exec, AKernelThatIsNotUsableIsSaidSo) {
   writeFile(world.folder() / "knob.conf", "kernel = none\n");
   expectOwnFailure({"web", "--", "true"},
