@@ -7,10 +7,12 @@
 #include <algorithm>
 
 #include "knob/linux/control_values.h"
+#include "knob/linux/fixed_groups.h"
 #include "knob/linux/memory_lowering.h"
 #include "knob/linux/writes.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
+#include "knob/signature.h"
 
 namespace Knob::Linux {
 namespace {
@@ -28,12 +30,22 @@ class Checker {
       : groups_(groups), books_(books), facts_(facts), repair_(repair) {}
 
   std::vector<Finding> run() {
+    checkLibrary();
     list();
     for (size_t i = entries_.size(); i-- > 0;) checkEntry(entries_[i]);
     return std::move(findings_);
   }
 
  private:
+  // Records have a version of their own, so another interface's groups can be taken over.
+  void checkLibrary() {
+    const BuildSignature noted = readSignature(groups_);
+    if (noted.md5 == buildSignature().md5) return;
+    if (repair_) writeSignature(*groups_.host());
+    report(std::string(kRootName),
+           "it was made with a libknob of another interface, built " + noted.buildDate, repair_);
+  }
+
   // A group that goes away meanwhile is no finding.
   template <typename F>
   void whileThere(const F &f) {

@@ -20,7 +20,7 @@ std::string optPath() {
 [[noreturn]] void notUsable(const Groups &groups, const KernelError &error) {
   std::string mend;
   if (error.status == Status::kPermissionDenied) {
-    mend = "; run as root, or let cgroup-root in knob.conf name a group that is yours";
+    mend = kMendRights;
   } else if (error.status == Status::kBusy) {
     mend = "; processes live in " + groups.hierarchy().path +
            " itself: move them to a group below it, or let cgroup-root name another";

@@ -2,12 +2,18 @@
 // library that made them.
 #pragma once
 
+#include <optional>
 #include <string>
+#include <string_view>
 
 #include "knob/kernel.h"
 #include "knob/linux/groups.h"
 
 namespace Knob::Linux {
+
+// How to mend that a process has no right to groups.
+inline constexpr const char *kMendRights =
+    "; run as root, or let cgroup-root in knob.conf name a group that is yours";
 
 // Makes what is missing of the two. Throws KernelError: kernel not usable, with the reason and how
 // to mend it.
