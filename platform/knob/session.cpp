@@ -4,6 +4,7 @@
 
 #include "common/key_value_file.h"
 #include "knob/emulated/emulated_kernel.h"
+#include "knob/linux/linux_kernel.h"
 
 namespace Knob {
 
@@ -17,7 +18,7 @@ Configuration sessionConfiguration() {
 
 std::unique_ptr<Kernel> openKernel(const Configuration &configuration, Opening opening) {
   if (configuration.kernel == Configuration::KernelKind::kLinux) {
-    throw KernelError(Status::kKernelNotUsable, "this build has no Linux kernel support");
+    return openLinuxKernel(configuration);
   }
   return openEmulatedKernel(configuration, opening);
 }

@@ -17,35 +17,58 @@ namespace {
   throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Ends with the test, however that ends.
-[[noreturn]] void holdMemory(size_t memoryMB, int ready) {
+// Ends with the test, however that ends. An order is an amount in MB; the answer is one byte.
+[[noreturn]] void holdWhatIsOrdered(int orders, int answers) {
   ::prctl(PR_SET_PDEATHSIG, SIGKILL);
-  const size_t size = memoryMB << 20;
-  volatile char *memory = static_cast<char *>(std::malloc(size + 1));
-  if (memory == nullptr) ::_exit(1);
-  for (size_t at = 0; at < size; at += 4096) memory[at] = 1;
-  const char byte = 0;
-  if (::write(ready, &byte, 1) != 1) ::_exit(1);
-  for (;;) ::pause();
+  constexpr size_t kPageBytes = 4096;
+  const char done = 0;
+  size_t memoryMB = 0;
+  while (::write(answers, &done, 1) == 1 &&
+         ::read(orders, &memoryMB, sizeof(memoryMB)) == static_cast<ssize_t>(sizeof(memoryMB))) {
+    const size_t size = memoryMB << 20;
+    volatile char *memory = static_cast<char *>(std::malloc(size + 1));
+    if (memory == nullptr) break;
+    for (size_t at = 0; at < size; at += kPageBytes) memory[at] = 1;
+  }
+  ::_exit(1);
+}
+
+void awaitAnswer(int answers) {
+  char byte = 0;
+  if (::read(answers, &byte, 1) != 1) fail("a process does not answer");
 }
 
 }  // namespace
 
-HeldProcess::HeldProcess(size_t memoryMB) {
-  int ready[2];
-  if (::pipe(ready) != 0) fail("pipe");
+HeldProcess::HeldProcess() {
+  int orders[2], answers[2];
+  if (::pipe(orders) != 0 || ::pipe(answers) != 0) fail("pipe");
   pid_ = ::fork();
   if (pid_ < 0) fail("fork");
-  if (pid_ == 0) holdMemory(memoryMB, ready[1]);
-  ::close(ready[1]);
-  char byte = 0;
-  const ssize_t got = ::read(ready[0], &byte, 1);
-  ::close(ready[0]);
-  if (got != 1) fail("start of a process");
+  if (pid_ == 0) {
+    // Without the other ends, the death of either process is seen by the other.
+    ::close(orders[1]);
+    ::close(answers[0]);
+    holdWhatIsOrdered(orders[0], answers[1]);
+  }
+  ::close(orders[0]);
+  ::close(answers[1]);
+  orders_ = orders[1];
+  answers_ = answers[0];
+  awaitAnswer(answers_);
 }
 
 HeldProcess::~HeldProcess() {
   end();
+  ::close(orders_);
+  ::close(answers_);
+}
+
+void HeldProcess::hold(size_t memoryMB) {
+  if (::write(orders_, &memoryMB, sizeof(memoryMB)) != static_cast<ssize_t>(sizeof(memoryMB))) {
+    fail("a process takes no orders");
+  }
+  awaitAnswer(answers_);
 }
 
 void HeldProcess::endButDoNotReap() {

@@ -1,4 +1,4 @@
-// A process that lives, and holds memory, until the case lets it go.
+// A process that lives, and holds what memory it is told to, until the case lets it go.
 #pragma once
 
 #include <sys/types.h>
@@ -9,13 +9,16 @@ namespace Contract {
 
 class HeldProcess {
  public:
-  // Returns once the process has touched that much memory.
-  explicit HeldProcess(size_t memoryMB = 0);
+  HeldProcess();
   HeldProcess(const HeldProcess &) = delete;
   HeldProcess &operator=(const HeldProcess &) = delete;
   ~HeldProcess();
 
   pid_t pid() const { return pid_; }
+
+  // Returns once the process has touched that much memory. What it held before its group was
+  // changed may be counted where it was then.
+  void hold(size_t memoryMB);
 
   // Ends it, and waits until it is a zombie; its id stays taken.
   void endButDoNotReap();
@@ -24,6 +27,7 @@ class HeldProcess {
 
  private:
   pid_t pid_ = -1;
+  int orders_ = -1, answers_ = -1;  // the ends of two pipes
 };
 
 }  // namespace Contract

@@ -93,8 +93,9 @@ constexpr int kHeldMB = 64;
 
 TEST_F(MemoryInUse, AMaxBelowItIsBusyAndChangesNothing) {
   const int64_t id = newGroup("host/opt", "pool");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   ASSERT_EQ(setMemory(id, {"min=10", "max=1000"}), kSuccess);
   EXPECT_EQ(setMemory(id, {"min=5", "max=30"}), kMemoryBusy);
   EXPECT_EQ(setMemory(id, {"min=0", "max=0", "minLimit=0", "shares=0"}), kMemoryBusy);
@@ -104,8 +105,9 @@ TEST_F(MemoryInUse, AMaxBelowItIsBusyAndChangesNothing) {
 
 TEST_F(MemoryInUse, AMaxAboveItIsTaken) {
   const int64_t id = newGroup("host/opt", "pool");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   EXPECT_EQ(setMemory(id, {"max=1000"}), kSuccess);
   EXPECT_EQ(setMemory(id, {"max=-1"}), kSuccess);
 }
@@ -114,8 +116,9 @@ TEST_F(MemoryInUse, ThatOfAGroupBelowCountsToo) {
   const int64_t parent = newGroup("host/opt", "parent");
   newGroup("host/opt/parent", "middle");
   const int64_t child = newGroup("host/opt/parent/middle", "child");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(child, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   EXPECT_EQ(setMemory(parent, {"max=30"}), kMemoryBusy);
   EXPECT_EQ(setMemory(idOf("host"), {"max=30"}), kMemoryBusy);
   EXPECT_EQ(memory(parent).value, kNewGroup);
@@ -125,15 +128,17 @@ TEST_F(MemoryInUse, ThatOfAnotherGroupDoesNotCount) {
   const int64_t id = newGroup("host/opt", "pool");
   const int64_t other = newGroup("host/opt", "other");
   newGroup("host/opt/other", "child");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   EXPECT_EQ(setMemory(other, {"max=0"}), kSuccess);
 }
 
 TEST_F(MemoryInUse, ItIsFreeOnceTheProcessEnded) {
   const int64_t id = newGroup("host/opt", "pool");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   ASSERT_EQ(setMemory(id, {"max=30"}), kMemoryBusy);
   process.end();
   EXPECT_EQ(setMemory(id, {"max=30"}), kSuccess);
@@ -145,16 +150,18 @@ TEST_F(MemoryInUse, WithoutProcessesAnyMaxIsTaken) {
 
 TEST_F(MemoryInUse, ItDoesNotHinderOtherSettings) {
   const int64_t id = newGroup("host/opt", "pool");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   EXPECT_EQ(setMemory(id, {"min=1", "minLimit=2", "shares=3"}), kSuccess);
   EXPECT_EQ(setCpu(id, {"max=0"}), kSuccess);
 }
 
 TEST_F(MemoryInUse, ABadParameterIsFoundBeforeIt) {
   const int64_t id = newGroup("host/opt", "pool");
-  HeldProcess process(kHeldMB);
+  HeldProcess process;
   ASSERT_EQ(join(id, process.pid()), kSuccess);
+  process.hold(kHeldMB);
   EXPECT_EQ(setMemory(id, {"min=31", "max=30"}), kBadParameter);
 }
 

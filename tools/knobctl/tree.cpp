@@ -13,6 +13,7 @@ namespace {
 
 constexpr uint64_t kBytesPerMB = 1048576;
 constexpr uint64_t kKBPerMB = 1024;
+constexpr uint64_t kMicrosecondsPerTenth = 100000;
 constexpr int64_t kBarColumns = 20;
 constexpr const char *kGreen = "\033[32m";
 constexpr const char *kPlain = "\033[0m";
@@ -27,7 +28,12 @@ struct Pending {
 std::vector<Pending> childrenOf(Knob::Kernel &kernel, const Pending &parent) {
   std::vector<Pending> children;
   for (const Knob::GroupId id : kernel.childGroups(parent.id)) {
-    children.push_back({parent.depth + 1, id, kernel.view(id).name});
+    try {
+      children.push_back({parent.depth + 1, id, kernel.view(id).name});
+    } catch (const Knob::KernelError &error) {
+      // One that went away meanwhile hides none of its siblings.
+      if (error.status != Knob::Status::kNotFound) throw;
+    }
   }
   std::sort(children.begin(), children.end(),
             [](const Pending &a, const Pending &b) { return a.name > b.name; });
@@ -46,6 +52,13 @@ std::string limit(int64_t value) {
 
 std::string used(const std::optional<uint64_t> &bytes) {
   return bytes ? std::to_string(*bytes / kBytesPerMB) : "-";
+}
+
+// Seconds with a tenth.
+std::string secondsUsed(const std::optional<uint64_t> &microseconds) {
+  if (!microseconds) return "-";
+  const uint64_t tenths = *microseconds / kMicrosecondsPerTenth;
+  return std::to_string(tenths / 10) + "." + std::to_string(tenths % 10);
 }
 
 // What of the machine is reserved as "#", and where the maximum stands as "|".
@@ -68,16 +81,22 @@ std::string bar(int64_t reserved, int64_t max, int64_t machine, Look look) {
 using Cells = std::vector<std::string>;
 
 Cells headings(int64_t machineMB, int64_t machinePercent) {
-  return {"GROUP",    "MEM MIN",
-          "MAX",      "RESERVED",
-          "USED",     "OF " + std::to_string(machineMB) + " MB",
-          "CPU MIN",  "MAX",
-          "RESERVED", "OF " + std::to_string(machinePercent) + " %",
+  return {"GROUP",
+          "MEM MIN",
+          "MAX",
+          "RESERVED",
+          "USED",
+          "OF " + std::to_string(machineMB) + " MB",
+          "CPU MIN",
+          "MAX",
+          "RESERVED",
+          "USED S",
+          "OF " + std::to_string(machinePercent) + " %",
           "PROCESSES"};
 }
 
 bool isLeftAligned(size_t column) {
-  return column == 0 || column == 5 || column == 9;
+  return column == 0 || column == 5 || column == 10;
 }
 
 Cells cellsOf(const TreeRow &row, int64_t machineMB, int64_t machinePercent, Look look) {
@@ -91,6 +110,7 @@ Cells cellsOf(const TreeRow &row, int64_t machineMB, int64_t machinePercent, Loo
           limit(group.cpu.min),
           limit(group.cpu.max),
           std::to_string(group.cpuReservationPercent),
+          secondsUsed(group.usage.cpuMicroseconds),
           bar(group.cpuReservationPercent, group.cpu.max, machinePercent, look),
           std::to_string(row.processes)};
 }

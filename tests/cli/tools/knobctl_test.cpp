@@ -173,11 +173,11 @@ TEST_F(Knobctl, TreeAlignsGroupsAndDrawsThemAgainstTheMachine) {
   allocate("host/opt/z", Knob::Resource::kCpu, minAndMax(1, -1));
   EXPECT_EQ(out({"tree"}),
             // clang-format off
-      "GROUP       MEM MIN   MAX  RESERVED  USED  OF 8192 MB              CPU MIN  MAX  RESERVED  OF 400 %                PROCESSES\n"
-      "host              0     -      2048     0  [#####...............]        0    -         1  [#...................]          0\n"
-      "  opt             0     -      2048     0  [#####...............]        0    -         1  [#...................]          0\n"
-      "    backup     2048  4096      2048     0  [#####.....|.........]        0  100         0  [.....|..............]          0\n"
-      "    z             0     -         0     0  [....................]        1    -         1  [#...................]          0\n");
+      "GROUP       MEM MIN   MAX  RESERVED  USED  OF 8192 MB              CPU MIN  MAX  RESERVED  USED S  OF 400 %                PROCESSES\n"
+      "host              0     -      2048     0  [#####...............]        0    -         1       -  [#...................]          0\n"
+      "  opt             0     -      2048     0  [#####...............]        0    -         1       -  [#...................]          0\n"
+      "    backup     2048  4096      2048     0  [#####.....|.........]        0  100         0       -  [.....|..............]          0\n"
+      "    z             0     -         0     0  [....................]        1    -         1       -  [#...................]          0\n");
   // clang-format on
 }
 

@@ -1,0 +1,111 @@
+// What openat2 does in one call is done part by part where a kernel lacks it or a filter forbids
+// it.
+#include "knob/linux/beneath.h"
+
+#include <fcntl.h>
+#include <linux/openat2.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstring>
+
+namespace Knob::Linux {
+namespace {
+
+using Platform::UniqueFd;
+
+constexpr int kDirectoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
+// The handle of a kernel object's directory: its 64-bit id and nothing else.
+constexpr int kKernfsHandleType = 0xfe;
+
+struct KernfsHandle {
+  file_handle head;  // ends in a flexible array: the id follows it
+  uint64_t id;
+};
+static_assert(sizeof(file_handle) == offsetof(KernfsHandle, id));
+
+int callOpenat2(int directory, const std::string &path, UniqueFd &opened) {
+  open_how how{};
+  how.flags = kDirectoryFlags;
+  how.resolve = RESOLVE_BENEATH | RESOLVE_NO_SYMLINKS | RESOLVE_NO_MAGICLINKS | RESOLVE_NO_XDEV;
+  for (;;) {
+    opened = UniqueFd(
+        static_cast<int>(::syscall(SYS_openat2, directory, path.c_str(), &how, sizeof how)));
+    if (opened) return 0;
+    // A rename or mount elsewhere on the machine came in between.
+    if (errno != EAGAIN && errno != EINTR) return errno;
+  }
+}
+
+// No mount has such a number.
+constexpr uint64_t kDeviceMark = uint64_t{1} << 63;
+
+// Without name_to_handle_at: the inode number is the id, and the device stands for the mount.
+int identifyByInode(int directory, const char *path, Identity &identity) {
+  struct stat status {};
+  if (::fstatat(directory, path, &status, AT_SYMLINK_NOFOLLOW | AT_EMPTY_PATH) != 0) return errno;
+  identity = {static_cast<GroupId>(status.st_ino), status.st_dev | kDeviceMark};
+  return 0;
+}
+
+bool isCallRefused(int error) {
+  return error == ENOSYS || error == EPERM;
+}
+
+}  // namespace
+
+int openBeneath(int directory, std::string_view path, UniqueFd &opened) {
+  if (path.size() >= PATH_MAX) return openPartByPart(directory, path, opened);
+  const int error = callOpenat2(directory, std::string(path), opened);
+  return isCallRefused(error) ? openPartByPart(directory, path, opened) : error;
+}
+
+int openPartByPart(int directory, std::string_view path, UniqueFd &opened) {
+  Identity start;
+  if (const int error = identify(directory, "", start); error != 0) return error;
+  int at = directory;
+  for (;;) {
+    const size_t end = path.find('/');
+    const std::string part(path.substr(0, end));
+    if (part == "..") return EXDEV;
+    UniqueFd next(::openat(at, part.c_str(), kDirectoryFlags));
+    if (!next) return errno;
+    Identity there;
+    if (const int error = identify(next.get(), "", there); error != 0) return error;
+    if (there.mount != start.mount) return EXDEV;
+    opened = std::move(next);
+    at = opened.get();
+    if (end == std::string_view::npos) return 0;
+    path.remove_prefix(end + 1);
+  }
+}
+
+int identify(int directory, const char *path, Identity &identity) {
+  KernfsHandle handle{};
+  handle.head.handle_bytes = sizeof handle.id;
+  int mount = 0;
+  if (::name_to_handle_at(directory, path, &handle.head, &mount, AT_EMPTY_PATH) == 0) {
+    if (handle.head.handle_type == kKernfsHandleType) {
+      identity = {static_cast<GroupId>(handle.id), static_cast<uint64_t>(mount)};
+      return 0;
+    }
+    return identifyByInode(directory, path, identity);
+  }
+  // EOVERFLOW: another file system's larger handle.
+  const bool noHandle = errno == EOPNOTSUPP || errno == EOVERFLOW || isCallRefused(errno);
+  return noHandle ? identifyByInode(directory, path, identity) : errno;
+}
+
+int openById(int anyDirectory, GroupId id, UniqueFd &opened) {
+  KernfsHandle handle{};
+  handle.head.handle_bytes = sizeof handle.id;
+  handle.head.handle_type = kKernfsHandleType;
+  handle.id = static_cast<uint64_t>(id);
+  opened = UniqueFd(::open_by_handle_at(anyDirectory, &handle.head, kDirectoryFlags));
+  return opened ? 0 : errno;
+}
+
+}  // namespace Knob::Linux

@@ -1,0 +1,251 @@
+// Growing is written from the top down and shrinking from the bottom up, so that a process killed
+// in between leaves too much reserved, never too little.
+#include "knob/linux/bookkeeper.h"
+
+#include <algorithm>
+#include <array>
+#include <limits>
+
+#include "knob/allocation.h"
+#include "knob/linux/control_values.h"
+#include "knob/linux/memory_lowering.h"
+#include "knob/linux/writes.h"
+#include "knob/peaks.h"
+
+namespace Knob::Linux {
+namespace {
+
+// What one file of a group holds.
+struct Value {
+  Control control;
+  std::string text;
+};
+using Values = std::array<Value, 2>;
+
+// The two files of one resource.
+Values valuesOf(Resource resource, const Books &books, uint32_t cpus) {
+  const int64_t reservation = reservationOf({books.allocation, books.childrenSum});
+  const Allocation &allocation = books.allocation;
+  if (resource == Resource::kMemory) {
+    return {Value{Control::kMemoryMin, memoryText(reservation)},
+            Value{Control::kMemoryMax, memoryText(allocation.max)}};
+  }
+  return {
+      Value{Control::kCpuWeight, std::to_string(cpuWeight(allocation.shares, reservation, cpus))},
+      Value{Control::kCpuMax, cpuMaxText(allocation.max)}};
+}
+
+// A record that cannot be read may be a newer library's: it is not written over in passing.
+const Held &requireReadable(const Held &held) {
+  if (held.isDamaged) {
+    throw KernelError(Status::kFailure,
+                      "the group's record is damaged or of another version; see knobctl check");
+  }
+  return held;
+}
+
+uint64_t limitIn(const Group &group, Control control) {
+  const auto text = readControlIfAny(group.directory, rowOf(control).name);
+  const uint64_t fresh = parseLimit(rowOf(control).fresh).value_or(0);
+  return text ? parseLimit(*text).value_or(fresh) : fresh;
+}
+
+// The nearest that our settings can express. No file tells a CPU minimum.
+Record readFiles(const Group &group) {
+  Record record;
+  record.memory.allocation.min = minimumMegabytes(limitIn(group, Control::kMemoryMin));
+  record.memory.allocation.max = maximumMegabytes(limitIn(group, Control::kMemoryMax));
+  record.cpu.allocation.shares = sharesOfWeight(limitIn(group, Control::kCpuWeight));
+  const auto bandwidth = readControlIfAny(group.directory, rowOf(Control::kCpuMax).name);
+  constexpr int64_t kMostPercent = std::numeric_limits<int32_t>::max();
+  if (bandwidth) {
+    record.cpu.allocation.max = std::min(parseCpuMax(*bandwidth).value_or(-1), kMostPercent);
+  }
+  record.peaks = raisedPeaks({}, record.memory.allocation.min, 0);
+  return record;
+}
+
+bool isLower(int64_t max, int64_t than) {
+  return max != -1 && (than == -1 || max < than);
+}
+
+bool areEqual(const Allocation &a, const Allocation &b) {
+  return a.min == b.min && a.max == b.max && a.minLimit == b.minLimit && a.shares == b.shares;
+}
+
+[[noreturn]] void refuse(const std::string &where) {
+  throw KernelError(Status::kReservationRefused, where + " has no room for this reservation");
+}
+
+const Record *storedIn(const Held &held) {
+  return held.isStored ? &held.record : nullptr;
+}
+
+}  // namespace
+
+// A group above the one that changes.
+struct Bookkeeper::Place {
+  GroupPtr group;
+  Held held;
+};
+
+std::string textOf(const Deviation &deviation) {
+  const std::string name = rowOf(deviation.control).name;
+  if (!deviation.actual) return "there is no " + name + ": its controller is not passed on";
+  return name + " is " + *deviation.actual + ", not " + deviation.expected;
+}
+
+Held Bookkeeper::read(Group &group) const {
+  const auto bytes = readAttribute(group.directory, kRecordAttribute);
+  if (!bytes) return {group.isFresh ? Record() : readFiles(group), false, false};
+  group.isFresh = false;
+  if (const auto record = decode(*bytes)) return {*record, true, false};
+  return {readFiles(group), false, true};
+}
+
+void Bookkeeper::change(Group &group, Resource resource, const AllocationChange &change) {
+  if (group.isFresh && !areEqual(changedAllocation({}, change), {})) {
+    // Most likely nobody has set anything of it yet, so its record is not looked for: making one
+    // fails when there is one. Only if this succeeds was it right.
+    try {
+      return changeHeld(group, {}, resource, change);
+    } catch (const KernelError &) {
+      group.isFresh = false;
+    }
+  }
+  changeHeld(group, requireReadable(read(group)), resource, change);
+}
+
+void Bookkeeper::changeHeld(Group &group, Held held, Resource resource,
+                            const AllocationChange &change) {
+  const Allocation current = held.record.books(resource).allocation;
+  const Allocation wanted = changedAllocation(current, change);
+  if (held.record.savedHigh) restoreMemoryHigh(group, held.record);
+  if (areEqual(wanted, current)) return groups_.requireAlive(group);
+  if (resource == Resource::kCpu && count(group, held)) held = requireReadable(read(group));
+  apply(group, held, resource, wanted);
+}
+
+bool Bookkeeper::count(Group &group, const Held &held) {
+  const Allocation &memory = held.record.memory.allocation;
+  if (held.isStored || memory.min == 0) return false;
+  apply(group, held, Resource::kMemory, memory);
+  return true;
+}
+
+void Bookkeeper::apply(Group &group, const Held &held, Resource resource,
+                       const Allocation &wanted) {
+  const Books &books = held.record.books(resource);
+  // Without a record nothing above counts the group's minimum yet.
+  const Level own = {held.isStored ? books.allocation : Allocation(), books.childrenSum};
+  const int64_t before = reservationOf(own);
+  const int64_t after = reservationOf({wanted, own.childrenSum});
+  if (after > before && after > machineCapacity(facts_, resource)) refuse("the machine");
+  const std::vector<Place> above =
+      before == after ? std::vector<Place>()
+                      : placesFrom(groups_.parentOf(group), resource, before, after);
+  const std::vector<Level> levels = admitted(own, above, resource, wanted);
+
+  Writes writes(groups_);
+  if (resource == Resource::kMemory && isLower(wanted.max, books.allocation.max)) {
+    makeRoomBelow(groups_, group, held, wanted.max, writes);
+  }
+  if (after < before) writeOwn(writes, group, held, resource, wanted);
+  writeSums(writes, above, resource, levels);
+  if (after >= before) writeOwn(writes, group, held, resource, wanted);
+  writes.commit();
+}
+
+void Bookkeeper::releaseChild(Group &parent, const Held &child) {
+  if (!child.isStored) return;
+  for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
+    const Books &books = child.record.books(resource);
+    Level own;
+    own.allocation.min = reservationOf({books.allocation, books.childrenSum});
+    if (own.allocation.min == 0) continue;
+    const std::vector<Place> above =
+        placesFrom(groups_.find(parent.id), resource, own.allocation.min, 0);
+    Writes writes(groups_);
+    writeSums(writes, above, resource, admitted(own, above, resource, Allocation()));
+    writes.commit();
+  }
+}
+
+std::vector<Deviation> Bookkeeper::deviations(Group &group, const Record &record) const {
+  std::vector<Deviation> found;
+  for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
+    for (const Value &value : valuesOf(resource, record.books(resource), facts_.cpus)) {
+      auto actual = readControlIfAny(group.directory, rowOf(value.control).name);
+      if (actual != value.text) found.push_back({value.control, value.text, std::move(actual)});
+    }
+  }
+  return found;
+}
+
+// From a group up to the last one whose reservation can change.
+std::vector<Bookkeeper::Place> Bookkeeper::placesFrom(GroupPtr group, Resource resource,
+                                                      int64_t before, int64_t after) {
+  std::vector<Place> places;
+  for (; group; group = groups_.parentOf(*group)) {
+    Held held = requireReadable(read(*group));
+    if (count(*group, held)) held = read(*group);
+    const Books &books = held.record.books(resource);
+    const int64_t sum = books.childrenSum - before + after;
+    places.push_back({group, held});
+    if (books.allocation.min >= std::max(sum, books.childrenSum)) break;
+    before = reservationOf({books.allocation, books.childrenSum});
+    after = reservationOf({books.allocation, sum});
+  }
+  return places;
+}
+
+std::vector<Level> Bookkeeper::admitted(const Level &own, const std::vector<Place> &above,
+                                        Resource resource, const Allocation &wanted) const {
+  std::vector<Level> levels = {own};
+  for (const Place &place : above) {
+    const Books &books = place.held.record.books(resource);
+    levels.push_back({books.allocation, books.childrenSum});
+  }
+  const auto answer = admit(std::move(levels), wanted, machineCapacity(facts_, resource));
+  if (!answer) refuse("the group, one above it or the machine");
+  return *answer;
+}
+
+void Bookkeeper::writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
+                          const Allocation &wanted) const {
+  const bool isKnown = held.isStored || group.isFresh;
+  Record after = held.record;
+  after.books(resource).allocation = wanted;
+  after.peaks = raisedPeaks(after.peaks, after.memory.allocation.min, after.memory.childrenSum);
+  writes.record(group, storedIn(held), after);
+
+  const Values from = valuesOf(resource, held.record.books(resource), facts_.cpus);
+  const Values to = valuesOf(resource, after.books(resource), facts_.cpus);
+  for (size_t i = 0; i < to.size(); ++i) {
+    const char *name = rowOf(to[i].control).name;
+    writes.control(group, to[i].control,
+                   isKnown ? from[i].text : readControl(group.directory, name), to[i].text);
+  }
+}
+
+// levels: what admission made of the group that changes, then of those places that change.
+void Bookkeeper::writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
+                           const std::vector<Level> &levels) const {
+  const size_t changed = levels.size() - 1;
+  const auto writeSum = [&](size_t i) {
+    const auto &[group, held] = above[i];
+    Record after = held.record;
+    after.books(resource).childrenSum = levels[i + 1].childrenSum;
+    after.peaks = raisedPeaks(after.peaks, after.memory.allocation.min, after.memory.childrenSum);
+    writes.record(*group, storedIn(held), after);
+    // The first value is the one that the reservation shows in.
+    const std::string from = valuesOf(resource, held.record.books(resource), facts_.cpus)[0].text;
+    const Value to = valuesOf(resource, after.books(resource), facts_.cpus)[0];
+    writes.control(*group, to.control, from, to.text);
+  };
+  if (changed == 0) return;
+  const bool grows = levels[1].childrenSum > above[0].held.record.books(resource).childrenSum;
+  for (size_t i = 0; i < changed; ++i) writeSum(grows ? changed - 1 - i : i);
+}
+
+}  // namespace Knob::Linux

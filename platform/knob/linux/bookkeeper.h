@@ -1,0 +1,67 @@
+// What groups have been given: reading it from their records or files, changing it, and keeping the
+// sums and the protection of everything above in step. The caller holds the lock on the tree.
+#pragma once
+
+#include <optional>
+#include <vector>
+
+#include "knob/admission.h"
+#include "knob/linux/groups.h"
+#include "knob/linux/record.h"
+#include "knob/linux/writes.h"
+
+namespace Knob::Linux {
+
+// A group's books, and whether they stand in a record of its own.
+struct Held {
+  Record record;  // what the files say, where there is no record
+  bool isStored = false;
+  bool isDamaged = false;  // there is a record that cannot be read
+};
+
+// A control file that should hold something else.
+struct Deviation {
+  Control control;
+  std::string expected;
+  std::optional<std::string> actual;  // absent: there is no such file
+};
+
+// "memory.max is 5, not max".
+std::string textOf(const Deviation &deviation);
+
+class Bookkeeper {
+ public:
+  Bookkeeper(Groups &groups, const HostFacts &facts) : groups_(groups), facts_(facts) {}
+
+  Held read(Group &group) const;
+
+  // Checks the whole change, then applies the whole. Throws KernelError: bad parameter, reservation
+  // refused, memory busy.
+  void change(Group &group, Resource resource, const AllocationChange &change);
+
+  // Takes a deleted child's reservations out of its parent and all above. child: as it was.
+  void releaseChild(Group &parent, const Held &child);
+
+  // What the files of a group should hold according to its record.
+  std::vector<Deviation> deviations(Group &group, const Record &record) const;
+
+ private:
+  struct Place;
+  void changeHeld(Group &group, Held held, Resource resource, const AllocationChange &change);
+  // A group that somebody else gave a minimum, and that now gets a record, is one more reservation:
+  // whether it was, and is counted now.
+  bool count(Group &group, const Held &held);
+  void apply(Group &group, const Held &held, Resource resource, const Allocation &wanted);
+  std::vector<Place> placesFrom(GroupPtr group, Resource resource, int64_t before, int64_t after);
+  std::vector<Level> admitted(const Level &own, const std::vector<Place> &above, Resource resource,
+                              const Allocation &wanted) const;
+  void writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
+                const Allocation &wanted) const;
+  void writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
+                 const std::vector<Level> &levels) const;
+
+  Groups &groups_;
+  const HostFacts &facts_;
+};
+
+}  // namespace Knob::Linux

@@ -1,0 +1,115 @@
+// Arithmetic and digits only; no file is touched here.
+#include "knob/linux/control_values.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+
+namespace Knob::Linux {
+namespace {
+
+constexpr uint64_t kMegabyte = 1024 * 1024;
+// Linux counts pages in a signed long: no more bytes than 2^63.
+constexpr int64_t kMostMegabytes = (int64_t{1} << 43) - 1;
+constexpr int64_t kPeriodMicroseconds = 100000;
+constexpr int64_t kMicrosecondsPerPercent = kPeriodMicroseconds / 100;
+constexpr int64_t kLeastWeight = 1, kMostWeight = 10000;
+
+struct ShareLevel {
+  int64_t shares, weight;
+};
+constexpr std::array kShareLevels = {ShareLevel{-2, 50}, ShareLevel{-3, 100}, ShareLevel{-4, 200}};
+
+int64_t sharesWeight(int64_t shares) {
+  for (const ShareLevel &level : kShareLevels) {
+    if (level.shares == shares) return level.weight;
+  }
+  return std::clamp(shares / 10, kLeastWeight, kMostWeight);
+}
+
+std::string_view trimmed(std::string_view text) {
+  while (!text.empty() && (text.back() == '\n' || text.back() == ' ')) text.remove_suffix(1);
+  return text;
+}
+
+}  // namespace
+
+std::string memoryText(int64_t megabytes) {
+  if (megabytes < 0 || megabytes > kMostMegabytes) return "max";
+  return std::to_string(static_cast<uint64_t>(megabytes) * kMegabyte);
+}
+
+std::string cpuMaxText(int64_t percent) {
+  // The most percent that a call can carry is far below the most that Linux takes.
+  const std::string quota =
+      percent < 0 ? "max" : std::to_string(std::max<int64_t>(percent, 1) * kMicrosecondsPerPercent);
+  return quota + " " + std::to_string(kPeriodMicroseconds);
+}
+
+int64_t cpuWeight(int64_t shares, int64_t reservationPercent, uint32_t cpus) {
+  const auto count = static_cast<int64_t>(std::max<uint32_t>(cpus, 1));
+  // 10000 parts of 100 percent a CPU. More than all CPUs is all of them.
+  const int64_t reserved = std::min(reservationPercent, 100 * count);
+  const int64_t parts = (reserved * 100 + count - 1) / count;
+  return std::clamp(std::max(sharesWeight(shares), parts), kLeastWeight, kMostWeight);
+}
+
+std::optional<uint64_t> parseLimit(std::string_view text) {
+  const std::string_view value = trimmed(text);
+  if (value == "max") return kUnlimited;
+  uint64_t number = 0;
+  const auto [stop, error] = std::from_chars(value.data(), value.data() + value.size(), number);
+  if (error != std::errc() || stop != value.data() + value.size()) return std::nullopt;
+  return number;
+}
+
+std::optional<int64_t> parseCpuMax(std::string_view text) {
+  const std::string_view value = trimmed(text);
+  const size_t blank = value.find(' ');
+  if (blank == std::string_view::npos) return std::nullopt;
+  const auto quota = parseLimit(value.substr(0, blank));
+  const auto period = parseLimit(value.substr(blank + 1));
+  if (!quota || !period || *period == 0 || *period == kUnlimited) return std::nullopt;
+  if (*quota == kUnlimited) return -1;
+  const uint64_t most = kUnlimited / 100;
+  return static_cast<int64_t>(std::min(*quota, most) * 100 / *period);
+}
+
+int64_t minimumMegabytes(uint64_t bytes) {
+  return static_cast<int64_t>(bytes / kMegabyte + (bytes % kMegabyte != 0 ? 1 : 0));
+}
+
+int64_t maximumMegabytes(uint64_t bytes) {
+  return bytes == kUnlimited ? -1 : static_cast<int64_t>(bytes / kMegabyte);
+}
+
+int64_t sharesOfWeight(uint64_t weight) {
+  const auto known = static_cast<int64_t>(std::min<uint64_t>(weight, kMostWeight));
+  for (const ShareLevel &level : kShareLevels) {
+    if (level.weight == known) return level.shares;
+  }
+  return known * 10;
+}
+
+std::optional<uint64_t> keyedValue(std::string_view text, std::string_view key) {
+  for (size_t start = 0; start < text.size();) {
+    const size_t end = std::min(text.find('\n', start), text.size());
+    const std::string_view line = text.substr(start, end - start);
+    if (line.size() > key.size() && line.substr(0, key.size()) == key && line[key.size()] == ' ') {
+      return parseLimit(line.substr(key.size() + 1));
+    }
+    start = end + 1;
+  }
+  return std::nullopt;
+}
+
+bool hasWord(std::string_view list, std::string_view word) {
+  for (size_t start = 0; start < list.size();) {
+    const size_t end = std::min(list.find_first_of(" \n", start), list.size());
+    if (list.substr(start, end - start) == word) return true;
+    start = end + 1;
+  }
+  return false;
+}
+
+}  // namespace Knob::Linux

@@ -1,0 +1,180 @@
+// Reading one group needs no lock: a record is one attribute, and Linux answers it whole.
+#include "knob/linux/kernel_on_groups.h"
+
+#include <cerrno>
+#include <limits>
+#include <optional>
+
+#include "knob/linux/check.h"
+#include "knob/linux/control_values.h"
+#include "knob/linux/errno_status.h"
+#include "knob/linux/fixed_groups.h"
+#include "knob/linux/members.h"
+#include "knob/machine_facts.h"
+#include "knob/names.h"
+
+namespace Knob::Linux {
+namespace {
+
+[[noreturn]] void notFound() {
+  throw KernelError(Status::kNotFound, "no such group");
+}
+
+HostFacts factsWith(uint32_t maxVms) {
+  HostFacts facts = readMachineFacts();
+  facts.maxVms = maxVms;
+  return facts;
+}
+
+bool isFixed(const std::vector<std::string_view> &path) {
+  return path.size() == 1 || (path.size() == 2 && path[1] == kFixedChildName);
+}
+
+}  // namespace
+
+KernelOnGroups::KernelOnGroups(Hierarchy hierarchy, uint32_t maxVms)
+    : groups_(std::move(hierarchy)), facts_(factsWith(maxVms)), books_(groups_, facts_) {}
+
+GroupId KernelOnGroups::lookUp(std::string_view path) {
+  const auto components = splitPath(path);
+  if (!components || components->front() != kRootName) notFound();
+  GroupPtr group = groups_.lookUp(path);
+  if (!group && isFixed(*components)) {
+    makeFixedGroups(groups_);
+    group = groups_.lookUp(path);
+  }
+  if (!group) notFound();
+  return group->id;
+}
+
+GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
+  if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
+  const GroupPtr above = groups_.find(parent);
+  groups_.passOn(*above);
+  try {
+    const GroupPtr group = groups_.make(*above, name);
+    requireControllers(*group, *above);
+    return group->id;
+  } catch (const KernelError &) {
+    // A group that got no child still takes processes.
+    groups_.takeBack(*above);
+    throw;
+  }
+}
+
+// Another process may have taken the controllers back since this one has seen them passed on. The
+// file that is opened to see that is the one that a change of settings needs first.
+void KernelOnGroups::requireControllers(Group &group, Group &parent) {
+  try {
+    (void)groups_.open(group, Control::kMemoryMin);
+  } catch (const KernelError &error) {
+    // Removed by somebody at once; that does not undo that it was made.
+    if (error.status == Status::kNotFound) return;
+    groups_.remove(group, parent);
+    throw;
+  }
+}
+
+void KernelOnGroups::remove(GroupId id) {
+  const GroupPtr top = host();
+  const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
+  const GroupPtr group = groups_.find(id);
+  const GroupPtr parent = groups_.parentOf(*group);
+  if (!parent || (parent->id == top->id && groups_.nameOf(*group) == kFixedChildName)) {
+    throw KernelError(Status::kPermissionDenied, "the group is there for good");
+  }
+  const Held held = books_.read(*group);
+  groups_.remove(*group, *parent);
+  books_.releaseChild(*parent, held);
+  groups_.takeBack(*parent);
+}
+
+Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
+  const GroupPtr group = groups_.find(id);
+  const Held held = books_.read(*group);
+  groups_.requireAlive(*group);  // a directory keeps its attributes when it is gone
+  return held.record.books(resource).allocation;
+}
+
+void KernelOnGroups::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
+  const TreeLock lock(host()->directory, TreeLock::Kind::kExclusive);
+  books_.change(*groups_.find(id), resource, change);
+}
+
+std::vector<GroupId> KernelOnGroups::childGroups(GroupId id) {
+  std::vector<GroupId> ids;
+  for (const Child &child : groups_.children(*groups_.find(id))) ids.push_back(child.id);
+  return ids;
+}
+
+std::vector<int64_t> KernelOnGroups::members(GroupId id) {
+  return readMembers(*groups_.find(id));
+}
+
+void KernelOnGroups::join(GroupId id, int64_t pid) {
+  const TreeLock lock(host()->directory, TreeLock::Kind::kExclusive);
+  const GroupPtr group = groups_.find(id);
+  if (groups_.hasChildren(*group)) {
+    groups_.requireAlive(*group);
+    throw KernelError(Status::kBusy, "child groups are in it");
+  }
+  addMember(*group, pid);
+}
+
+MemoryStatistics KernelOnGroups::memoryStatistics(GroupId id) {
+  const GroupPtr group = groups_.find(id);
+  const Held held = books_.read(*group);
+  groups_.requireAlive(*group);
+  return held.record.peaks;
+}
+
+BuildSignature KernelOnGroups::signature() {
+  return readSignature(groups_);
+}
+
+GroupView KernelOnGroups::view(GroupId id) {
+  const GroupPtr group = groups_.find(id);
+  const TreeLock lock(host()->directory, TreeLock::Kind::kShared);
+  const Held held = books_.read(*group);
+  groups_.requireAlive(*group);
+
+  GroupView view;
+  view.id = id;
+  view.name = groups_.nameOf(*group);
+  view.memory = held.record.memory.allocation;
+  view.cpu = held.record.cpu.allocation;
+  view.memoryReservationMB = reservationOf({view.memory, held.record.memory.childrenSum});
+  view.cpuReservationPercent = reservationOf({view.cpu, held.record.cpu.childrenSum});
+  if (const auto bytes = readControlIfAny(group->directory, kMemoryCurrentFile)) {
+    view.usage.memoryBytes = parseLimit(*bytes);
+  }
+  if (const auto text = readControlIfAny(group->directory, kCpuStatFile)) {
+    view.usage.cpuMicroseconds = keyedValue(*text, "usage_usec");
+  }
+  if (held.isDamaged) {
+    view.deviation = "its record cannot be read";
+  } else if (held.isStored) {
+    for (const Deviation &deviation : books_.deviations(*group, held.record)) {
+      view.deviation += (view.deviation.empty() ? "" : "; ") + textOf(deviation);
+    }
+  }
+  return view;
+}
+
+std::vector<Finding> KernelOnGroups::check(bool repair) {
+  makeFixedGroups(groups_);
+  const GroupPtr top = host();
+  const TreeLock lock(top->directory,
+                      repair ? TreeLock::Kind::kExclusive : TreeLock::Kind::kShared);
+  return checkTree(groups_, books_, facts_, repair);
+}
+
+// Every id that a caller can have came from a look-up below it, so it is there.
+GroupPtr KernelOnGroups::host() {
+  if (const GroupPtr group = groups_.openHost()) return group;
+  makeFixedGroups(groups_);
+  if (const GroupPtr group = groups_.host()) return group;
+  notFound();
+}
+
+}  // namespace Knob::Linux

@@ -1,0 +1,42 @@
+// Each operation of the kernel interface on cgroup directories, under the lock on the tree where it
+// changes or compares more than one thing.
+#pragma once
+
+#include <string_view>
+#include <vector>
+
+#include "knob/kernel.h"
+#include "knob/linux/bookkeeper.h"
+#include "knob/linux/groups.h"
+#include "knob/linux/tree_lock.h"
+
+namespace Knob::Linux {
+
+class KernelOnGroups : public Kernel {
+ public:
+  KernelOnGroups(Hierarchy hierarchy, uint32_t maxVms);
+
+  GroupId lookUp(std::string_view path) override;
+  GroupId create(GroupId parent, std::string_view name) override;
+  void remove(GroupId id) override;
+  Allocation readAllocation(GroupId id, Resource resource) override;
+  void setAllocation(GroupId id, Resource resource, const AllocationChange &change) override;
+  std::vector<GroupId> childGroups(GroupId id) override;
+  std::vector<int64_t> members(GroupId id) override;
+  void join(GroupId id, int64_t pid) override;
+  MemoryStatistics memoryStatistics(GroupId id) override;
+  HostFacts facts() override { return facts_; }
+  BuildSignature signature() override;
+  GroupView view(GroupId id) override;
+  std::vector<Finding> check(bool repair) override;
+
+ private:
+  GroupPtr host();
+  void requireControllers(Group &group, Group &parent);
+
+  Groups groups_;
+  const HostFacts facts_;
+  Bookkeeper books_;
+};
+
+}  // namespace Knob::Linux

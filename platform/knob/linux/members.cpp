@@ -1,0 +1,49 @@
+// cgroup.procs holds one living process a line; zombies are left out by Linux itself.
+#include "knob/linux/members.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <charconv>
+#include <limits>
+
+#include "knob/linux/errno_status.h"
+
+namespace Knob::Linux {
+
+std::vector<int64_t> parseMembers(std::string_view text) {
+  std::vector<int64_t> pids;
+  for (size_t start = 0; start < text.size();) {
+    const size_t end = std::min(text.find('\n', start), text.size());
+    int64_t pid = 0;
+    const auto [stop, error] = std::from_chars(text.data() + start, text.data() + end, pid);
+    // A process outside our process-id space is written as 0, which would name ourselves.
+    if (error == std::errc() && stop == text.data() + end && pid > 0) pids.push_back(pid);
+    start = end + 1;
+  }
+  return pids;
+}
+
+std::vector<int64_t> readMembers(const Group &group) {
+  return parseMembers(readControl(group.directory, kMembersFile));
+}
+
+void addMember(Group &group, int64_t pid) {
+  // 0 would be this process itself.
+  if (pid <= 0 || pid > std::numeric_limits<int32_t>::max()) {
+    throw KernelError(Status::kNotFound, "no such process");
+  }
+  const std::string text = std::to_string(pid);
+  int error = writeControl(group.directory, kMembersFile, text);
+  if (error == EBUSY) {
+    // Its last child group is gone, but it still passes its controllers on.
+    error = writeControl(group.directory, kSubtreeFile, kTakeBack);
+    if (error == 0) {
+      group.passesOn = false;
+      error = writeControl(group.directory, kMembersFile, text);
+    }
+  }
+  if (error != 0) fail(error, "cannot move process " + text);
+  group.isFresh = false;
+}
+
+}  // namespace Knob::Linux

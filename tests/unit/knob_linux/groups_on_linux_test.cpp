@@ -1,0 +1,577 @@
+// What only a real kernel shows of the Linux kernel's own business: groups of somebody else,
+// records and files that were tampered with, rights, other places for the tree. Runs as root of a
+// machine of its own.
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <linux/capability.h>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <sstream>
+#include <system_error>
+
+#include "knob/linux/linux_kernel.h"
+#include "knob/linux/record.h"
+#include "knob/signature.h"
+#include "knob/status.h"
+
+namespace Knob::Linux {
+namespace {
+
+using std::filesystem::path;
+using testing::HasSubstr;
+
+const path kMount = "/sys/fs/cgroup";
+
+std::string fileText(const path &group, const std::string &name) {
+  std::ifstream file(kMount / group / name);
+  std::stringstream text;
+  text << file.rdbuf();
+  std::string all = text.str();
+  while (!all.empty() && all.back() == '\n') all.pop_back();
+  return all;
+}
+
+void write(const path &group, const std::string &name, const std::string &text) {
+  const int file = ::open((kMount / group / name).c_str(), O_WRONLY | O_CLOEXEC);
+  const ssize_t count = file < 0 ? -1 : ::write(file, text.data(), text.size());
+  const int error = errno;
+  if (file >= 0) ::close(file);
+  if (count < 0) throw std::system_error(error, std::generic_category(), (group / name).string());
+}
+
+void removeTree(const path &group) {
+  if (!std::filesystem::exists(kMount / group)) return;
+  write(group, "cgroup.kill", "1");
+  for (const auto &entry : std::filesystem::directory_iterator(kMount / group)) {
+    if (entry.is_directory()) removeTree(group / entry.path().filename());
+  }
+  while (::rmdir((kMount / group).c_str()) != 0) {
+    if (errno != EBUSY) throw std::system_error(errno, std::generic_category(), group.string());
+    ::usleep(1000);
+  }
+}
+
+std::string attribute(const path &group, const char *name) {
+  char value[256];
+  const ssize_t size = ::getxattr((kMount / group).c_str(), name, value, sizeof(value));
+  return size < 0 ? "" : std::string(value, static_cast<size_t>(size));
+}
+
+void setAttribute(const path &group, const char *name, const std::string &value) {
+  ASSERT_EQ(::setxattr((kMount / group).c_str(), name, value.data(), value.size(), 0), 0);
+}
+
+// A process in a group until the end of the test. memoryMB: taken in the group.
+class Member {
+ public:
+  explicit Member(const path &group, size_t memoryMB = 0) {
+    int ready[2];
+    if (::pipe(ready) != 0 || (pid_ = ::fork()) < 0) throw std::runtime_error("no process");
+    if (pid_ == 0) {
+      write(group, "cgroup.procs", "0");
+      std::string memory(memoryMB << 20, 'x');
+      if (::write(ready[1], memory.c_str(), 1) != 1) ::_exit(1);
+      for (;;) ::pause();
+    }
+    ::close(ready[1]);
+    char byte = 0;
+    if (::read(ready[0], &byte, 1) != 1) throw std::runtime_error("no process");
+    ::close(ready[0]);
+  }
+  ~Member() {
+    ::kill(pid_, SIGKILL);
+    ::waitpid(pid_, nullptr, 0);
+  }
+  Member(const Member &) = delete;
+  Member &operator=(const Member &) = delete;
+
+ private:
+  pid_t pid_ = -1;
+};
+
+class OnLinux : public testing::Test {
+ protected:
+  OnLinux() {
+    if (::getenv("UML_MACHINE") == nullptr) return;
+    for (const char *group : {"host", "theirs"}) removeTree(group);
+    configuration_.kernel = Configuration::KernelKind::kLinux;
+  }
+  void SetUp() override {
+    if (::getenv("UML_MACHINE") == nullptr) GTEST_SKIP() << "runs in a machine of its own only";
+    kernel_ = open();
+  }
+  ~OnLinux() override {
+    if (::getenv("UML_MACHINE") == nullptr) return;
+    kernel_.reset();
+    for (const char *group : {"host", "theirs"}) removeTree(group);
+  }
+
+  std::unique_ptr<Kernel> open() { return openLinuxKernel(configuration_); }
+  GroupId create(const std::string &parent, const std::string &name) {
+    return kernel_->create(kernel_->lookUp(parent), name);
+  }
+  void setMemory(GroupId id, int64_t min, int64_t max) {
+    AllocationChange change;
+    change.min = min;
+    change.max = max;
+    kernel_->setAllocation(id, Resource::kMemory, change);
+  }
+  void setCpuMin(GroupId id, int64_t min) {
+    AllocationChange change;
+    change.min = min;
+    kernel_->setAllocation(id, Resource::kCpu, change);
+  }
+  std::vector<std::string> check(bool repair) {
+    std::vector<std::string> lines;
+    for (const Finding &finding : kernel_->check(repair)) {
+      lines.push_back(finding.path + ": " + finding.text + (finding.mended ? " (mended)" : ""));
+    }
+    return lines;
+  }
+
+  Configuration configuration_;
+  std::unique_ptr<Kernel> kernel_;
+};
+
+Status statusOfCall(const std::function<void()> &call, std::string *text = nullptr) {
+  try {
+    call();
+    return Status::kSuccess;
+  } catch (const KernelError &error) {
+    if (text != nullptr) *text = error.what();
+    return error.status;
+  }
+}
+
+// ---- groups of somebody else
+
+TEST_F(OnLinux, AGroupOfSomebodyElseIsReadFromItsFilesAndLeftAlone) {
+  create("host/opt", "ours");
+  ASSERT_EQ(::mkdir((kMount / "host/opt/other").c_str(), 0755), 0);
+  write("host/opt/other", "memory.min", "5242880");
+  write("host/opt/other", "memory.max", "104857600");
+  write("host/opt/other", "cpu.max", "25000 50000");
+  write("host/opt/other", "cpu.weight", "200");
+  const GroupId id = kernel_->lookUp("host/opt/other");
+  const Allocation memory = kernel_->readAllocation(id, Resource::kMemory);
+  EXPECT_EQ(memory.min, 5);
+  EXPECT_EQ(memory.max, 100);
+  EXPECT_EQ(memory.minLimit, -1);
+  const Allocation cpu = kernel_->readAllocation(id, Resource::kCpu);
+  EXPECT_EQ(cpu.max, 50);
+  EXPECT_EQ(cpu.shares, -4);
+  EXPECT_TRUE(kernel_->view(id).deviation.empty());
+  EXPECT_TRUE(check(true).empty());
+  EXPECT_EQ(attribute("host/opt/other", kRecordAttribute), "");
+  EXPECT_EQ(fileText("host", "memory.min"), "0");
+}
+
+TEST_F(OnLinux, SettingSomethingOfItMakesItsMinimumAReservation) {
+  create("host/opt", "ours");
+  ASSERT_EQ(::mkdir((kMount / "host/opt/other").c_str(), 0755), 0);
+  write("host/opt/other", "memory.min", "5242880");
+  setCpuMin(kernel_->lookUp("host/opt/other"), 3);
+  EXPECT_EQ(fileText("host/opt", "memory.min"), "5242880");
+  EXPECT_EQ(fileText("host", "memory.min"), "5242880");
+  EXPECT_EQ(fileText("host/opt/other", "memory.min"), "5242880");
+  EXPECT_TRUE(check(false).empty());
+  kernel_->remove(kernel_->lookUp("host/opt/other"));
+  EXPECT_EQ(fileText("host", "memory.min"), "0");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AReservationBelowItKeepsWhatItHadAndIsCarriedUp) {
+  create("host/opt", "ours");
+  ASSERT_EQ(::mkdir((kMount / "host/opt/other").c_str(), 0755), 0);
+  write("host/opt/other", "memory.min", "5242880");
+  const GroupId child = create("host/opt/other", "child");
+  setMemory(child, 3, -1);
+  EXPECT_EQ(fileText("host/opt/other", "memory.min"), "5242880");
+  EXPECT_EQ(fileText("host", "memory.min"), "5242880");
+  setMemory(child, 8, -1);
+  EXPECT_EQ(fileText("host/opt/other", "memory.min"), "8388608");
+  EXPECT_EQ(fileText("host", "memory.min"), "8388608");
+  EXPECT_TRUE(check(false).empty());
+}
+
+// ---- records and files that were tampered with
+
+TEST_F(OnLinux, AFileThatSaysSomethingElseIsFoundAndMended) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 10, 100);
+  write("host/opt", "memory.min", "0");
+  write("host/opt/pool", "memory.max", "max");
+  write("host/opt/pool", "cpu.weight", "77");
+  EXPECT_EQ(kernel_->view(id).deviation,
+            "memory.max is max, not 104857600; cpu.weight is 77, not 100");
+  EXPECT_THAT(check(false),
+              testing::UnorderedElementsAre("host/opt/pool: memory.max is max, not 104857600",
+                                            "host/opt/pool: cpu.weight is 77, not 100",
+                                            "host/opt: memory.min is 0, not 10485760"));
+  EXPECT_EQ(check(true).size(), 3U);
+  EXPECT_TRUE(check(false).empty());
+  EXPECT_EQ(fileText("host/opt", "memory.min"), "10485760");
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "104857600");
+}
+
+TEST_F(OnLinux, AMaximumThatLivingProcessesExceedIsToldAndNotForced) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 20);
+  write("host/opt/pool", "memory.max", "max");
+  const Member member("host/opt/pool", 50);
+  const auto findings = kernel_->check(true);
+  ASSERT_EQ(findings.size(), 1U);
+  EXPECT_FALSE(findings[0].mended);
+  EXPECT_THAT(findings[0].text, HasSubstr("living processes hold"));
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "max");
+  EXPECT_EQ(fileText("host/opt/pool", "memory.high"), "max");
+  EXPECT_THAT(fileText("host/opt/pool", "memory.events"), HasSubstr("oom_kill 0"));
+}
+
+TEST_F(OnLinux, ADamagedRecordIsToldNotWrittenOverAndMadeAnewByRepair) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 10, 100);
+  setAttribute("host/opt/pool", kRecordAttribute, "nonsense");
+  EXPECT_EQ(kernel_->readAllocation(id, Resource::kMemory).min, 10) << "its files still say so";
+  EXPECT_EQ(statusOfCall([&] { setMemory(id, 20, 100); }), Status::kFailure);
+  EXPECT_EQ(attribute("host/opt/pool", kRecordAttribute), "nonsense");
+  EXPECT_EQ(fileText("host", "memory.min"), "10485760");
+  EXPECT_FALSE(check(false).empty());
+  EXPECT_FALSE(check(true).empty());
+  EXPECT_TRUE(check(false).empty());
+  setMemory(id, 20, 100);
+  EXPECT_EQ(fileText("host", "memory.min"), "20971520");
+}
+
+TEST_F(OnLinux, WrongSumsAreRecounted) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 10, -1);
+  setCpuMin(id, 20);
+  Record record = *decode(attribute("host/opt", kRecordAttribute));
+  record.memory.childrenSum = 99;
+  record.cpu.childrenSum = 0;
+  const RecordBytes bytes = encode(record);
+  setAttribute("host/opt", kRecordAttribute, {bytes.data(), bytes.size()});
+  const auto lines = check(true);
+  EXPECT_THAT(
+      lines, testing::Contains("host/opt: its children reserve 10 MB of memory, its record says 99 "
+                               "(mended)"));
+  EXPECT_THAT(lines, testing::Contains("host/opt: its children reserve 20 percent of CPU, its "
+                                       "record says 0 (mended)"));
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ARecordTakenOffAGroupWithReservationsBelowIsFoundAndMadeAnew) {
+  create("host/opt", "parent");
+  setMemory(create("host/opt/parent", "child"), 10, -1);
+  ASSERT_EQ(::removexattr((kMount / "host/opt/parent").c_str(), kRecordAttribute), 0);
+  EXPECT_FALSE(check(false).empty());
+  EXPECT_FALSE(check(true).empty());
+  EXPECT_TRUE(check(false).empty());
+  EXPECT_EQ(fileText("host", "memory.min"), "10485760");
+}
+
+TEST_F(OnLinux, AMemoryHighThatADeadProcessLeftLoweredIsPutBack) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  Record record = *decode(attribute("host/opt/pool", kRecordAttribute));
+  record.savedHigh = uint64_t{64} << 20;
+  const RecordBytes bytes = encode(record);
+  for (const bool byRepair : {false, true}) {
+    setAttribute("host/opt/pool", kRecordAttribute, {bytes.data(), bytes.size()});
+    write("host/opt/pool", "memory.high", "1048576");
+    if (byRepair) {
+      EXPECT_EQ(check(true).size(), 1U);
+    } else {
+      setMemory(id, 1, 100);
+    }
+    EXPECT_EQ(fileText("host/opt/pool", "memory.high"), "67108864");
+    EXPECT_FALSE(decode(attribute("host/opt/pool", kRecordAttribute))->savedHigh);
+    setMemory(id, 0, 100);
+  }
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ControllersThatSomebodyTookBackAreMissedAndPassedOnAgain) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 10, 100);
+  write("host/opt", "cgroup.subtree_control", "-memory");
+  EXPECT_THAT(kernel_->view(id).deviation, HasSubstr("there is no memory.min"));
+  EXPECT_FALSE(check(true).empty());
+  EXPECT_TRUE(check(false).empty());
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "104857600");
+}
+
+// ---- who may, and where
+
+// Drops every capability of this thread's effective set.
+void dropCapabilities() {
+  __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
+  __user_cap_data_struct none[2] = {};
+  ASSERT_EQ(::syscall(SYS_capset, &header, none), 0);
+}
+
+// Runs in a process of its own, which may give up what it has.
+void elsewhere(const std::function<void()> &work) {
+  const pid_t pid = ::fork();
+  if (pid == 0) {
+    work();
+    ::_exit(testing::Test::HasFailure() ? 1 : 0);
+  }
+  int status = -1;
+  ::waitpid(pid, &status, 0);
+  EXPECT_EQ(status, 0);
+}
+
+TEST_F(OnLinux, WithoutTheRightToOpenByIdGroupsAreFoundByWalking) {
+  create("host/opt", "a");
+  const GroupId id = create("host/opt/a", "b");
+  setMemory(id, 10, 100);
+  const GroupId host = kernel_->lookUp("host");
+  elsewhere([&] {
+    dropCapabilities();
+    const auto kernel = open();
+    EXPECT_EQ(kernel->readAllocation(id, Resource::kMemory).min, 10);
+    EXPECT_EQ(kernel->view(id).name, "b");
+    EXPECT_EQ(kernel->childGroups(host).size(), 1U);
+    EXPECT_EQ(statusOfCall([&] { kernel->view(id + 1000000); }), Status::kNotFound);
+    EXPECT_EQ(statusOfCall([&] { kernel->view(1); }), Status::kNotFound);
+    kernel->remove(id);
+    EXPECT_EQ(statusOfCall([&] { kernel->view(id); }), Status::kNotFound);
+  });
+}
+
+TEST_F(OnLinux, SomebodyWithoutRightsReadsButChangesNothing) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 10, 100);
+  elsewhere([&] {
+    ASSERT_EQ(::setuid(12345), 0);
+    const auto kernel = open();
+    EXPECT_EQ(kernel->lookUp("host/opt/pool"), id);
+    EXPECT_EQ(kernel->readAllocation(id, Resource::kMemory).min, 10);
+    AllocationChange change;
+    change.min = 20;
+    EXPECT_EQ(statusOfCall([&] { kernel->setAllocation(id, Resource::kMemory, change); }),
+              Status::kPermissionDenied);
+    EXPECT_EQ(statusOfCall([&] { kernel->create(id, "below"); }), Status::kPermissionDenied);
+    EXPECT_EQ(statusOfCall([&] { kernel->remove(id); }), Status::kPermissionDenied);
+    EXPECT_TRUE(kernel->check(false).empty());
+    EXPECT_THAT(lookAtLinuxHost(configuration_).problems,
+                testing::ElementsAre(HasSubstr("no right to make or change groups")));
+  });
+  EXPECT_EQ(fileText("host", "memory.min"), "10485760");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, SomebodyWithoutRightsCannotMakeTheFirstGroup) {
+  elsewhere([&] {
+    ASSERT_EQ(::setuid(12345), 0);
+    std::string text;
+    EXPECT_EQ(statusOfCall([&] { open()->lookUp("host"); }, &text), Status::kKernelNotUsable);
+    EXPECT_THAT(text, HasSubstr("run as root, or let cgroup-root"));
+  });
+}
+
+class Elsewhere : public OnLinux {
+ protected:
+  void makeTheirs(const std::string &passedOn) {
+    write("", "cgroup.subtree_control", "+memory +cpu");
+    ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+    ASSERT_EQ(::mkdir((kMount / "theirs/ours").c_str(), 0755), 0);
+    if (!passedOn.empty()) write("theirs", "cgroup.subtree_control", passedOn);
+    configuration_.cgroupRoot = "/theirs/ours/";
+  }
+  std::string whyNot() {
+    std::string text;
+    EXPECT_EQ(statusOfCall([&] { open()->lookUp("host"); }, &text), Status::kKernelNotUsable);
+    return text;
+  }
+};
+
+TEST_F(Elsewhere, TheTreeStandsBelowTheFolderThatTheConfigurationNames) {
+  makeTheirs("+memory +cpu");
+  kernel_ = open();
+  setMemory(create("host/opt", "pool"), 10, -1);
+  EXPECT_EQ(fileText("theirs/ours/host/opt/pool", "memory.min"), "10485760");
+  EXPECT_EQ(fileText("theirs/ours", "memory.min"), "0") << "not ours to write";
+  EXPECT_FALSE(std::filesystem::exists(kMount / "host"));
+}
+
+TEST_F(Elsewhere, APromiseThatTheGroupsAboveDoNotKeepIsTold) {
+  makeTheirs("+memory +cpu");
+  kernel_ = open();
+  setMemory(create("host/opt", "pool"), 10, -1);
+  const auto lines = check(true);
+  ASSERT_EQ(lines.size(), 2U);
+  EXPECT_THAT(lines[0], HasSubstr("memory.min of /sys/fs/cgroup/theirs/ours, which is not ours"));
+  EXPECT_THAT(lines[1], HasSubstr("memory.min of /sys/fs/cgroup/theirs, which is not ours"));
+  EXPECT_EQ(lookAtLinuxHost(configuration_).problems.size(), 2U);
+  write("theirs", "memory.min", "10485760");
+  write("theirs/ours", "memory.min", "20971520");
+  EXPECT_TRUE(check(false).empty());
+  EXPECT_TRUE(lookAtLinuxHost(configuration_).problems.empty());
+}
+
+TEST_F(Elsewhere, AFolderThatIsNotThereIsSaid) {
+  configuration_.cgroupRoot = "theirs/none";
+  EXPECT_THAT(whyNot(), HasSubstr("cgroup-root: /sys/fs/cgroup/theirs/none: No such file"));
+}
+
+TEST_F(Elsewhere, AFolderCannotLeadOut) {
+  configuration_.cgroupRoot = "../../..";
+  EXPECT_THAT(whyNot(), HasSubstr("cgroup-root"));
+}
+
+TEST_F(Elsewhere, ControllersThatAreNotPassedOnAreSaid) {
+  makeTheirs("+cpu");
+  EXPECT_THAT(whyNot(), HasSubstr("the memory controller is not passed on to "
+                                  "/sys/fs/cgroup/theirs/ours; write +memory"));
+}
+
+TEST_F(Elsewhere, ProcessesInTheFolderAreSaid) {
+  makeTheirs("+memory +cpu");
+  const Member member("theirs/ours");
+  EXPECT_THAT(whyNot(), HasSubstr("processes live in /sys/fs/cgroup/theirs/ours itself"));
+}
+
+// Runs in a process with mounts of its own.
+void withOwnMounts(const std::function<void()> &work) {
+  elsewhere([&] {
+    ASSERT_EQ(::unshare(CLONE_NEWNS), 0);
+    ASSERT_EQ(::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr), 0);
+    work();
+  });
+}
+
+TEST_F(Elsewhere, AMachineWithoutTheMountIsToldHowToGetIt) {
+  withOwnMounts([&] {
+    ASSERT_EQ(::umount2(kMount.c_str(), MNT_DETACH), 0);
+    EXPECT_THAT(whyNot(), HasSubstr("no cgroup2 file system is mounted"));
+  });
+}
+
+TEST_F(Elsewhere, AReadOnlyMountIsSaid) {
+  withOwnMounts([&] {
+    ASSERT_EQ(::mount(nullptr, kMount.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr),
+              0);
+    EXPECT_THAT(whyNot(), HasSubstr("is read-only; mount -o remount,rw /sys/fs/cgroup"));
+  });
+}
+
+TEST_F(Elsewhere, AHiddenMountIsPassedOverForOneThatCanBeReached) {
+  withOwnMounts([&] {
+    ASSERT_EQ(::mount("none", "/run", "tmpfs", 0, nullptr), 0);
+    ASSERT_EQ(::mkdir("/run/my groups", 0755), 0);
+    ASSERT_EQ(::mount("none", "/run/my groups", "cgroup2", 0, nullptr), 0);
+    ASSERT_EQ(::mount("none", kMount.c_str(), "tmpfs", 0, nullptr), 0);
+    EXPECT_EQ(lookAtLinuxHost(configuration_).path, "/run/my groups");
+    EXPECT_EQ(statusOfCall([&] { open()->lookUp("host/opt"); }), Status::kSuccess);
+  });
+}
+
+TEST_F(Elsewhere, WhereEveryMountIsHiddenThatIsSaid) {
+  withOwnMounts([&] {
+    ASSERT_EQ(::mount("none", kMount.c_str(), "tmpfs", 0, nullptr), 0);
+    EXPECT_THAT(whyNot(), HasSubstr("hidden by another mount"));
+  });
+}
+
+// ---- the library that made host
+
+TEST_F(OnLinux, AnUpgradeOfTheLibraryLeavesGroupsUsableWhileTheInterfaceIsTheSame) {
+  create("host/opt", "pool");
+  const std::string older = buildSignature().md5 + " Jan  1 2020 00:00:00";
+  setAttribute("host", kLibraryAttribute, older);
+  EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
+  EXPECT_EQ(kernel_->signature().buildDate, "Jan  1 2020 00:00:00");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AnotherInterfaceMatchesOnlyOnceItsGroupsAreGoneOrTakenOver) {
+  const std::string other = std::string(32, 'f') + " Jan  1 2020 00:00:00";
+  create("host/opt", "pool");
+  setAttribute("host", kLibraryAttribute, other);
+  EXPECT_EQ(kernel_->signature().md5, std::string(32, 'f'));
+  EXPECT_FALSE(check(true).empty());
+  EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
+
+  setAttribute("host", kLibraryAttribute, other);
+  kernel_->remove(kernel_->lookUp("host/opt/pool"));
+  EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
+  EXPECT_EQ(attribute("host", kLibraryAttribute).substr(0, 32), buildSignature().md5);
+}
+
+TEST_F(OnLinux, AskingForTheSignatureMakesNothing) {
+  EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
+  EXPECT_FALSE(std::filesystem::exists(kMount / "host"));
+}
+
+// ---- what a process keeps open
+
+TEST_F(OnLinux, ManyGroupsInUseKeepFewDescriptorsOpen) {
+  std::vector<GroupId> ids;
+  for (int i = 0; i < 200; ++i) {
+    ids.push_back(create("host/opt", "pool" + std::to_string(i)));
+    setMemory(ids.back(), 0, 10);
+  }
+  for (const GroupId id : ids) EXPECT_EQ(kernel_->readAllocation(id, Resource::kMemory).max, 10);
+  long open = 0;
+  for (const auto &entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+    open += entry.is_symlink() ? 1 : 0;
+  }
+  EXPECT_LT(open, 200);
+}
+
+TEST_F(OnLinux, ATreeThatWasRemovedAndMadeAgainByOthersIsFound) {
+  const GroupId before = create("host/opt", "pool");
+  setMemory(before, 10, -1);
+  removeTree("host");
+  EXPECT_EQ(statusOfCall([&] { kernel_->readAllocation(before, Resource::kMemory); }),
+            Status::kNotFound);
+  const auto other = open();
+  const GroupId after = other->create(other->lookUp("host/opt"), "pool");
+  EXPECT_NE(after, before);
+  EXPECT_EQ(kernel_->lookUp("host/opt/pool"), after);
+  setMemory(after, 20, -1);
+  EXPECT_EQ(fileText("host", "memory.min"), "20971520");
+  EXPECT_EQ(kernel_->readAllocation(after, Resource::kMemory).min, 20);
+}
+
+TEST_F(OnLinux, WhatAnotherProcessSetOfANewGroupIsNotLost) {
+  const GroupId id = create("host/opt", "pool");
+  AllocationChange limit;
+  limit.minLimit = 50;
+  limit.min = 30;
+  open()->setAllocation(id, Resource::kMemory, limit);
+  setMemory(id, 40, 100);
+  const Allocation memory = kernel_->readAllocation(id, Resource::kMemory);
+  EXPECT_EQ(memory.minLimit, 50);
+  EXPECT_EQ(memory.min, 40);
+  EXPECT_EQ(fileText("host", "memory.min"), "41943040");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, SettingANewGroupBackToItsDefaultsUndoesWhatAnotherProcessSet) {
+  const GroupId id = create("host/opt", "pool");
+  AllocationChange change;
+  change.min = 30;
+  open()->setAllocation(id, Resource::kMemory, change);
+  setMemory(id, 0, -1);
+  EXPECT_EQ(kernel_->readAllocation(id, Resource::kMemory).min, 0);
+  EXPECT_EQ(fileText("host", "memory.min"), "0");
+  EXPECT_TRUE(check(false).empty());
+}
+
+}  // namespace
+}  // namespace Knob::Linux
