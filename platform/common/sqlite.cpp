@@ -62,39 +62,40 @@ Database::Database(const std::string &path, Mode mode, int busyMs) {
   }
   const std::string name = mode == Mode::kImmutable ? immutableUri(path) : path;
   sqlite3 *handle = nullptr;
-  const int result = sqlite3_open_v2(name.c_str(), &handle, flags, nullptr);
+  const int result = sqliteLibrary().open_v2(name.c_str(), &handle, flags, nullptr);
   handle_.reset(handle);  // SQLite hands out a handle to close even when it could not open
   if (result != SQLITE_OK) fail(result);
-  sqlite3_extended_result_codes(handle, 1);
-  sqlite3_busy_handler(handle, waitForOthers, reinterpret_cast<void *>(intptr_t{busyMs}));
+  sqliteLibrary().extended_result_codes(handle, 1);
+  sqliteLibrary().busy_handler(handle, waitForOthers, reinterpret_cast<void *>(intptr_t{busyMs}));
 }
 
 void Database::execute(const char *sql) {
-  const int result = sqlite3_exec(handle_.get(), sql, nullptr, nullptr, nullptr);
+  const int result = sqliteLibrary().exec(handle_.get(), sql, nullptr, nullptr, nullptr);
   if (result != SQLITE_OK) fail(result);
 }
 
 void Database::fail(int resultCode) const {
   if ((resultCode & 0xff) == SQLITE_NOMEM) throw std::bad_alloc();
-  throw SqliteError(resultCode,
-                    handle_ ? sqlite3_errmsg(handle_.get()) : sqlite3_errstr(resultCode));
+  throw SqliteError(resultCode, handle_ ? sqliteLibrary().errmsg(handle_.get())
+                                        : sqliteLibrary().errstr(resultCode));
 }
 
 void Statement::prepare() {
   sqlite3_stmt *handle = nullptr;
-  const int result = sqlite3_prepare_v3(database_.get(), sql_.data(), static_cast<int>(sql_.size()),
-                                        SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
+  const int result =
+      sqliteLibrary().prepare_v3(database_.get(), sql_.data(), static_cast<int>(sql_.size()),
+                                 SQLITE_PREPARE_PERSISTENT, &handle, nullptr);
   if (result != SQLITE_OK) database_.fail(result);
   handle_.reset(handle);
 }
 
 // A reset repeats the error of the last step, which has been thrown already.
 Run::~Run() {
-  (void)sqlite3_reset(statement_);
+  (void)sqliteLibrary().reset(statement_);
 }
 
 bool Run::step() {
-  const int result = sqlite3_step(statement_);
+  const int result = sqliteLibrary().step(statement_);
   if (result == SQLITE_ROW) return true;
   if (result == SQLITE_DONE) return false;
   database_.fail(result);
@@ -102,28 +103,29 @@ bool Run::step() {
 
 std::string Run::text(int column) const {
   // The text first: asking for it may convert the value, and the size is that of the result.
-  const unsigned char *bytes = sqlite3_column_text(statement_, column);
-  const int size = sqlite3_column_bytes(statement_, column);
+  const unsigned char *bytes = sqliteLibrary().column_text(statement_, column);
+  const int size = sqliteLibrary().column_bytes(statement_, column);
   if (bytes == nullptr) return {};
   return {reinterpret_cast<const char *>(bytes), static_cast<size_t>(size)};
 }
 
 void Run::bind(int position, int64_t value) {
-  check(sqlite3_bind_int64(statement_, position, value));
+  check(sqliteLibrary().bind_int64(statement_, position, value));
 }
 
 void Run::bind(int position, double value) {
-  check(sqlite3_bind_double(statement_, position, value));
+  check(sqliteLibrary().bind_double(statement_, position, value));
 }
 
 void Run::bind(int position, std::string_view text) {
   // A null pointer would bind NULL instead of an empty text.
   const char *bytes = text.data() == nullptr ? "" : text.data();
-  check(sqlite3_bind_text64(statement_, position, bytes, text.size(), SQLITE_STATIC, SQLITE_UTF8));
+  check(sqliteLibrary().bind_text64(statement_, position, bytes, text.size(), SQLITE_STATIC,
+                                    SQLITE_UTF8));
 }
 
 void Run::bind(int position, std::nullptr_t) {
-  check(sqlite3_bind_null(statement_, position));
+  check(sqliteLibrary().bind_null(statement_, position));
 }
 
 void Run::check(int resultCode) const {
@@ -137,9 +139,9 @@ Transaction::Transaction(TransactionStatements &statements, Kind kind) : stateme
 Transaction::~Transaction() {
   if (!open_) return;
   // Some failures have rolled back already; then there is nothing left to do here.
-  if (sqlite3_get_autocommit(statements_.rollback.database().get()) != 0) return;
-  (void)sqlite3_step(statements_.rollback.get());
-  (void)sqlite3_reset(statements_.rollback.get());
+  if (sqliteLibrary().get_autocommit(statements_.rollback.database().get()) != 0) return;
+  (void)sqliteLibrary().step(statements_.rollback.get());
+  (void)sqliteLibrary().reset(statements_.rollback.get());
 }
 
 void Transaction::commit() {

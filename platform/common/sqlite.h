@@ -4,14 +4,14 @@
 // Declare a Database before its Statements: they are released before it.
 #pragma once
 
-#include <sqlite3.h>
-
 #include <cstdint>
 #include <memory>
 #include <stdexcept>
 #include <string>
 #include <string_view>
 #include <utility>
+
+#include "common/sqlite_library.h"
 
 namespace Platform {
 
@@ -37,8 +37,8 @@ class Database {
   // Runs texts that answer nothing of use, one or several.
   void execute(const char *sql);
 
-  int64_t lastInsertId() const { return sqlite3_last_insert_rowid(handle_.get()); }
-  int64_t changedRows() const { return sqlite3_changes(handle_.get()); }
+  int64_t lastInsertId() const { return sqliteLibrary().last_insert_rowid(handle_.get()); }
+  int64_t changedRows() const { return sqliteLibrary().changes(handle_.get()); }
   sqlite3 *get() const { return handle_.get(); }
 
   // Throws the error that a call on this database has just answered.
@@ -46,7 +46,7 @@ class Database {
 
  private:
   struct Closer {
-    void operator()(sqlite3 *handle) const { sqlite3_close(handle); }
+    void operator()(sqlite3 *handle) const { sqliteLibrary().close(handle); }
   };
   std::unique_ptr<sqlite3, Closer> handle_;
 };
@@ -65,7 +65,7 @@ class Statement {
 
  private:
   struct Finalizer {
-    void operator()(sqlite3_stmt *handle) const { sqlite3_finalize(handle); }
+    void operator()(sqlite3_stmt *handle) const { sqliteLibrary().finalize(handle); }
   };
   void prepare();
 
@@ -97,9 +97,9 @@ class Run {
   }
 
   bool isNull(int column) const { return type(column) == SQLITE_NULL; }
-  int type(int column) const { return sqlite3_column_type(statement_, column); }
-  int64_t integer(int column) const { return sqlite3_column_int64(statement_, column); }
-  double real(int column) const { return sqlite3_column_double(statement_, column); }
+  int type(int column) const { return sqliteLibrary().column_type(statement_, column); }
+  int64_t integer(int column) const { return sqliteLibrary().column_int64(statement_, column); }
+  double real(int column) const { return sqliteLibrary().column_double(statement_, column); }
   std::string text(int column) const;
 
  private:

@@ -151,7 +151,8 @@ std::unique_ptr<Database> openForWriting(const std::string &path) {
   // The log stays when the last writer closes, empty: a reader who may not make one beside the
   // store finds it there.
   int keep = 1;
-  (void)sqlite3_file_control(database->get(), "main", SQLITE_FCNTL_PERSIST_WAL, &keep);
+  (void)Platform::sqliteLibrary().file_control(database->get(), "main", SQLITE_FCNTL_PERSIST_WAL,
+                                               &keep);
   database->execute(
       "PRAGMA journal_mode = WAL; PRAGMA journal_size_limit = 0; PRAGMA foreign_keys = ON");
   return database;
