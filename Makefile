@@ -34,7 +34,7 @@ asan ubsan:
 	@scripts/run-ctest build/$@
 
 lint:
-	@scripts/install-deps build test bench lint
+	@scripts/install-deps build test lint
 	@scripts/build --tests release tests/all all
 	@scripts/lint
 

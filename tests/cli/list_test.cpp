@@ -44,6 +44,16 @@ TEST_F(List, TableShowsAPoolsNineValues) {
   expectRun(result, 0, kTableHeader + line, "");
 }
 
+TEST_F(List, EachLineIsWrittenAsSoonAsItIsKnown) {
+  world.hostCalls();
+  const auto file = world.file("pools.yaml", "- name: host/a\n- name: host/b\n");
+  expectRun(world.poolctl({"list", file}), 0,
+            kTableHeader + tableLine({"host/a", "yes", "0", "-", "-", "-", "0", "-", "1000"}) +
+                tableLine({"host/b", "yes", "0", "-", "-", "-", "0", "-", "1000"}),
+            "");
+  EXPECT_EQ(world.flushes(), (Calls{"flush 153", "flush 153", "flush 153"}));
+}
+
 TEST_F(List, CsvHasNoPadding) {
   EXPECT_EQ(csv("- {name: host/vim, memMin: 512, memShares: -3, cpuMin: -1, cpuShares: -1}\n"),
             "host/vim,yes,512,-,-,normal,-,-,-\n");

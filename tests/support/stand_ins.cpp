@@ -91,7 +91,17 @@ std::vector<std::string> StandInWorld::misuse() const {
 }
 
 std::vector<std::string> StandInWorld::hostTrace() const {
-  return lines(readFile(environment.at("HOST_CALLS_TRACE")));
+  std::vector<std::string> result;
+  for (const std::string &line : lines(readFile(environment.at("HOST_CALLS_TRACE"))))
+    if (!beginsWith(line, "flush ")) result.push_back(line);
+  return result;
+}
+
+std::vector<std::string> StandInWorld::flushes() const {
+  std::vector<std::string> result;
+  for (const std::string &line : lines(readFile(environment.at("HOST_CALLS_TRACE"))))
+    if (beginsWith(line, "flush ")) result.push_back(line);
+  return result;
 }
 
 std::vector<std::string> StandInWorld::configTrace() const {

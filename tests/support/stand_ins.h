@@ -34,7 +34,8 @@ class StandInWorld : public World {
   std::vector<std::string> kernelCalls() const;  // KNOB_Get, KNOB_Set, KNOB_GetInstanceListAlloc
   std::vector<std::string> groupCalls() const;   // the same without the facts of the machine
   std::vector<std::string> misuse() const;       // faults in the use of lists, or a missing end
-  std::vector<std::string> hostTrace() const;
+  std::vector<std::string> hostTrace() const;    // log and sleep, of the host calls
+  std::vector<std::string> flushes() const;      // of standard output
   std::vector<std::string> configTrace() const;
   std::string groups() const;  // as they are at the end, one a line
   bool wasInjected() const;    // a rule made a call fail

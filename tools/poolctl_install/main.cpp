@@ -20,9 +20,8 @@ int main(int argc, char **argv) {
   app.add_option("FILE", operands, "Definition files; with --remove, names in /etc/rp.d")
       ->required();
   app.footer(
-      "Exit status: 0 done; 1 refused or failed; 2 wrong usage; 3 no such file. Nothing has "
-      "changed "
-      "unless it is 0.\n");
+      "Exit status: 0 done; 1 refused or failed; 2 wrong usage; 3 no such file.\n"
+      "Nothing has changed unless it is 0.\n");
   return Tools::runTool(app, argc, argv, [&] {
     if (mark) {
       Install::markFiles(operands);

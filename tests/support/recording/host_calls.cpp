@@ -1,8 +1,10 @@
 // Preloaded into a program under test: writes down what it sends to the system log, which it still
 // sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
 // at the second that HOST_CALLS_TIME names and moves only by what the program sleeps. The file that
-// HOST_CALLS_UNREADABLE names cannot be opened, not even by root.
+// HOST_CALLS_UNREADABLE names cannot be opened, not even by root. What is flushed to
+// standard output is written down with its size.
 #include <dlfcn.h>
+#include <stdio_ext.h>
 #include <syslog.h>
 #include <time.h>
 #include <unistd.h>
@@ -21,7 +23,7 @@ namespace {
 using Recording::formatted;
 using Recording::quoted;
 
-void write(const std::string &line) {
+void note(const std::string &line) {
   Recording::record("HOST_CALLS_TRACE", line);
 }
 
@@ -34,7 +36,7 @@ int64_t &microseconds() {
 }
 
 void pass(int64_t nanoseconds) {
-  write(formatted("sleep %ld", static_cast<long>(nanoseconds / 1000)));
+  note(formatted("sleep %ld", static_cast<long>(nanoseconds / 1000)));
   microseconds() += nanoseconds / 1000;
 }
 
@@ -50,7 +52,7 @@ Function *next(const char *name) {
 void logged(int priority, const char *format, va_list arguments) {
   char text[8192];
   vsnprintf(text, sizeof text, format, arguments);
-  write(formatted("syslog %d ", priority) + quoted(text));
+  note(formatted("syslog %d ", priority) + quoted(text));
   next<void(int, const char *, ...)>("syslog")(priority, "%s", text);
 }
 
@@ -70,12 +72,12 @@ FILE *opened(const char *function, const char *path, const char *mode) {
 extern "C" {
 
 void openlog(const char *ident, int options, int facility) {
-  write("openlog " + quoted(ident) + formatted(" %d %d", options, facility));
+  note("openlog " + quoted(ident) + formatted(" %d %d", options, facility));
   next<void(const char *, int, int)>("openlog")(ident, options, facility);
 }
 
 void closelog() {
-  write("closelog");
+  note("closelog");
   next<void()>("closelog")();
 }
 
@@ -122,6 +124,12 @@ int clock_nanosleep(clockid_t, int flags, const timespec *length, timespec *) {
   if (flags != 0) abort();  // an absolute time of another clock than this one
   pass(nanosecondsOf(*length));
   return 0;
+}
+
+int fflush(FILE *stream) {
+  const size_t pending = stream == stdout ? __fpending(stream) : 0;
+  if (pending != 0) note(formatted("flush %zu", pending));
+  return next<int(FILE *)>("fflush")(stream);
 }
 
 FILE *fopen(const char *path, const char *mode) {
