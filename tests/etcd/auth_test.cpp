@@ -118,7 +118,7 @@ TEST_F(EtcdUsers, ATokenThatCannotBeRenewedEndsTheRunsStore) {
 }
 
 TEST_F(EtcdUsers, APasswordFileThatOthersMayReadIsNotUsed) {
-  for (const mode_t mode : {0644, 0640, 0604, 0620}) {
+  for (const mode_t mode : std::initializer_list<mode_t>{0644, 0640, 0604, 0620}) {
     writePassword(kPassword, mode);
     EXPECT_THAT(refusalOf([&] { storeOf("host")->read(a_); }),
                 HasSubstr("password: the password file: others than its owner have access"));

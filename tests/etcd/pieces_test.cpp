@@ -264,7 +264,8 @@ TEST_F(PasswordFile, ItsOneLineIsThePassword) {
 }
 
 TEST_F(PasswordFile, IsRefusedWhenOthersHaveAccess) {
-  for (const mode_t mode : {0644, 0640, 0604, 0620, 0602, 0610, 0601}) {
+  for (const mode_t mode :
+       std::initializer_list<mode_t>{0644, 0640, 0604, 0620, 0602, 0610, 0601}) {
     const std::string why = ::Test::refusalOf([&] { (void)readPassword(write("secret", mode)); });
     EXPECT_THAT(why, HasSubstr("others than its owner have access"));
     EXPECT_THAT(why, testing::Not(HasSubstr("secret")));

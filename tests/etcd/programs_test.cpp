@@ -246,6 +246,17 @@ TEST_F(EtcdPrograms, AnImportBeyondTheServersLimitChangesNothingAndNamesIt) {
   EXPECT_EQ(kestrelctl({"list"}), "");
 }
 
+TEST_F(EtcdPrograms, KestrelctlFailsAndSaysWhyWhenNoMemberAnswers) {
+  configure("store = etcd\nendpoints = http://" + freePlace() + "\n");
+  for (const Arguments &arguments : {Arguments{"get", "a", "b", "c"},
+                                     Arguments{"set", "a", "b", "c", "d", "1"},
+                                     {"list"},
+                                     Arguments{"delete", "a", "b", "c"},
+                                     {"export"}}) {
+    EXPECT_THAT(kestrelctl(arguments, 1), HasSubstr("no member answers")) << arguments[0];
+  }
+}
+
 TEST_F(EtcdPrograms, StatusTellsOfEachMemberAndWhetherTheStoreCanBeUsed) {
   serve(1, "500");
   const std::string url = etcd_->urls()[0];

@@ -328,12 +328,6 @@ TEST_F(Kestrelctl, ABadConfigurationIsNamedWithItsLineByEveryCommand) {
   }
 }
 
-TEST_F(Kestrelctl, AnEngineThatThisBuildLacksIsAFailure) {
-  writeFile(path("kestrel.conf"), "store = etcd\nendpoints = http://127.0.0.1:1\n");
-  EXPECT_THAT(err(1, {"get", "a", "b", "c"}),
-              StartsWith("kestrelctl: FOLDER/kestrel.conf: store: this build has no etcd module"));
-}
-
 TEST_F(Kestrelctl, AWrongLineIsAUsageError) {
   EXPECT_EQ(err(2, {}), "kestrelctl: a sub-command is required\nTry 'kestrelctl --help'.\n");
   EXPECT_THAT(err(2, {"put"}), HasSubstr("put"));

@@ -173,12 +173,6 @@ TEST_F(Front, ABadConfigurationIsAFailureWithFileAndLine) {
   EXPECT_THAT(failureOf([] { store(); }), HasSubstr("kestrel.conf:2: store: bad value"));
 }
 
-TEST_F(Front, AStoreOfAnEngineThatThisBuildLacksIsAFailure) {
-  configure("store = etcd\nendpoints = http://127.0.0.1:1\n");
-  EXPECT_THAT(failureOf([] { store(); }),
-              HasSubstr("kestrel.conf: store: this build has no etcd module"));
-}
-
 TEST_F(Front, AHeldStoreReadsOnAfterAnotherWasOpened) {
   put("x", int64_t{1});
   const auto held = store();
