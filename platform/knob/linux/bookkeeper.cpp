@@ -89,6 +89,11 @@ struct Bookkeeper::Place {
   Held held;
 };
 
+int64_t saturatedSum(int64_t left, int64_t right) {
+  constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
+  return right > 0 && left > kMost - right ? kMost : left + right;
+}
+
 std::string textOf(const Deviation &deviation) {
   const std::string name = rowOf(deviation.control).name;
   if (!deviation.actual) return "there is no " + name + ": its controller is not passed on";
@@ -190,7 +195,7 @@ std::vector<Bookkeeper::Place> Bookkeeper::placesFrom(GroupPtr group, Resource r
     Held held = requireReadable(read(*group));
     if (count(*group, held)) held = read(*group);
     const Books &books = held.record.books(resource);
-    const int64_t sum = books.childrenSum - before + after;
+    const int64_t sum = saturatedSum(books.childrenSum - before, after);
     places.push_back({group, held});
     if (books.allocation.min >= std::max(sum, books.childrenSum)) break;
     before = reservationOf({books.allocation, books.childrenSum});

@@ -26,6 +26,10 @@ struct Deviation {
   std::optional<std::string> actual;  // absent: there is no such file
 };
 
+// The sum of two amounts of which the second is not negative. Amounts beyond every machine, as only
+// a record written by somebody else holds them, stay that.
+int64_t saturatedSum(int64_t left, int64_t right);
+
 // "memory.max is 5, not max".
 std::string textOf(const Deviation &deviation);
 

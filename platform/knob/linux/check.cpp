@@ -83,8 +83,9 @@ class Checker {
       const int64_t memory = reservationOf({record.memory.allocation, entry.memorySum});
       const int64_t cpu = reservationOf({record.cpu.allocation, entry.cpuSum});
       if (&entry == &entries_.front()) return checkMachine(memory, cpu);
-      entries_[entry.parent].memorySum += memory;
-      entries_[entry.parent].cpuSum += cpu;
+      Entry &parent = entries_[entry.parent];
+      parent.memorySum = saturatedSum(parent.memorySum, memory);
+      parent.cpuSum = saturatedSum(parent.cpuSum, cpu);
     });
   }
 

@@ -339,7 +339,8 @@ GroupPtr Groups::findByWalking(GroupId id) {
     for (Child &child : children(group)) {
       const std::string path = folder + "/" + child.name;
       if (child.id == id) {
-        if (const GroupPtr found = lookUp(path)) return found;
+        const GroupPtr found = lookUp(path);
+        if (found && found->id == id) return found;
         notFound();
       }
       folders.push_back(path);

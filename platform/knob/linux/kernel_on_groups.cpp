@@ -97,7 +97,8 @@ Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
 }
 
 void KernelOnGroups::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
-  const TreeLock lock(host()->directory, TreeLock::Kind::kExclusive);
+  const GroupPtr top = host();  // outlives the lock on its directory
+  const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
   books_.change(*groups_.find(id), resource, change);
 }
 
@@ -112,7 +113,8 @@ std::vector<int64_t> KernelOnGroups::members(GroupId id) {
 }
 
 void KernelOnGroups::join(GroupId id, int64_t pid) {
-  const TreeLock lock(host()->directory, TreeLock::Kind::kExclusive);
+  const GroupPtr top = host();
+  const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
   const GroupPtr group = groups_.find(id);
   if (groups_.hasChildren(*group)) {
     groups_.requireAlive(*group);
@@ -133,8 +135,9 @@ BuildSignature KernelOnGroups::signature() {
 }
 
 GroupView KernelOnGroups::view(GroupId id) {
+  const GroupPtr top = host();
+  const TreeLock lock(top->directory, TreeLock::Kind::kShared);
   const GroupPtr group = groups_.find(id);
-  const TreeLock lock(host()->directory, TreeLock::Kind::kShared);
   const Held held = books_.read(*group);
   groups_.requireAlive(*group);
 

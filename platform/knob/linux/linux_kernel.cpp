@@ -21,14 +21,17 @@ bool mayMakeGroupsIn(int directory) {
   return mayWrite(directory, ".") && mayWrite(directory, Linux::kSubtreeFile);
 }
 
-}  // namespace
-
-std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration) {
-  return std::make_unique<Linux::KernelOnGroups>(Linux::openHierarchy(configuration),
-                                                 configuration.maxVms);
+// Whatever goes wrong before there is a kernel means that there is none.
+template <typename F>
+auto beforeUse(const F &f) {
+  try {
+    return f();
+  } catch (const KernelError &error) {
+    throw KernelError(Status::kKernelNotUsable, error.what());
+  }
 }
 
-LinuxHost lookAtLinuxHost(const Configuration &configuration) {
+LinuxHost lookAt(const Configuration &configuration) {
   Linux::Groups groups(Linux::openHierarchy(configuration));
   LinuxHost host;
   host.path = groups.hierarchy().path;
@@ -48,6 +51,19 @@ LinuxHost lookAtLinuxHost(const Configuration &configuration) {
     host.problems.push_back(std::move(text));
   }
   return host;
+}
+
+}  // namespace
+
+std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration) {
+  return beforeUse([&] {
+    return std::make_unique<Linux::KernelOnGroups>(Linux::openHierarchy(configuration),
+                                                   configuration.maxVms);
+  });
+}
+
+LinuxHost lookAtLinuxHost(const Configuration &configuration) {
+  return beforeUse([&] { return lookAt(configuration); });
 }
 
 }  // namespace Knob

@@ -6,6 +6,7 @@
 #include <cstring>
 #include <string>
 
+#include "knob/linux/bookkeeper.h"
 #include "knob/linux/control_values.h"
 
 namespace Knob::Linux {
@@ -105,6 +106,16 @@ TEST(Record, ValuesThatNoOperationLeavesBehindAreDamaged) {
   EXPECT_FALSE(decode(withNumber(8, -5))) << "CPU shares";
   EXPECT_FALSE(decode(withNumber(9, -1))) << "CPU sum";
   EXPECT_TRUE(decode(withNumber(4, 0)));
+}
+
+TEST(SaturatedSum, StopsAtTheMostInsteadOfTurningNegative) {
+  constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
+  EXPECT_EQ(saturatedSum(3, 4), 7);
+  EXPECT_EQ(saturatedSum(-3, 4), 1);
+  EXPECT_EQ(saturatedSum(kMost - 1, 1), kMost);
+  EXPECT_EQ(saturatedSum(kMost, 1), kMost);
+  EXPECT_EQ(saturatedSum(kMost, kMost), kMost);
+  EXPECT_EQ(saturatedSum(kMost, 0), kMost);
 }
 
 }  // namespace
