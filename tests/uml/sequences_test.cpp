@@ -76,10 +76,10 @@ TEST_P(BothKernels, AnswerRandomSequencesWithTheSameStatusesAndTrees) {
   const std::string difference = firstDifference(linux.out, emulated.out);
   const unsigned culprit =
       static_cast<unsigned>(std::stoul(difference.substr(difference.find_first_of("0123456789"))));
-  const unsigned whole = culprit - first + 1;
+  const std::string withTrees = runLinux(first, culprit - first + 1, true).out;
   ADD_FAILURE() << difference << "with the trees:\n"
-                << firstDifference(runLinux(first, whole, true).out,
-                                   runEmulated(linux.out, first, whole, true).out);
+                << firstDifference(withTrees,
+                                   runEmulated(withTrees, first, culprit - first + 1, true).out);
 }
 
 INSTANTIATE_TEST_SUITE_P(Boot, BothKernels, testing::Range(0U, kBoots));
