@@ -5,10 +5,30 @@
 #include <cerrno>
 #include <charconv>
 #include <limits>
+#include <string>
+#include <system_error>
 
+#include "common/read_file.h"
 #include "knob/linux/errno_status.h"
 
 namespace Knob::Linux {
+namespace {
+
+constexpr size_t kMostBytes = 4096;
+
+// The kernel takes a zombie without a word, and leaves it where it is.
+bool isAlive(const std::string &pid) {
+  try {
+    const std::string stat = Platform::readFile("/proc/" + pid + "/stat", kMostBytes);
+    // "PID (NAME) STATE ...": the name may hold parentheses too.
+    const size_t state = stat.rfind(") ") + 2;
+    return state < stat.size() && stat[state] != 'Z' && stat[state] != 'X';
+  } catch (const std::system_error &) {
+    return false;
+  }
+}
+
+}  // namespace
 
 std::vector<int64_t> parseMembers(std::string_view text) {
   std::vector<int64_t> pids;
@@ -43,6 +63,7 @@ void addMember(Group &group, int64_t pid) {
     }
   }
   if (error != 0) fail(error, "cannot move process " + text);
+  if (!isAlive(text)) throw KernelError(Status::kNotFound, "no such process");
   group.isFresh = false;
 }
 
