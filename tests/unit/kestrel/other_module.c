@@ -1,4 +1,6 @@
 /* A shared library that is no module of this version. */
 int kestrelModuleOpen0(void);
 
-int kestrelModuleOpen0(void) { return 0; }
+int kestrelModuleOpen0(void) {
+  return 0;
+}
