@@ -33,10 +33,11 @@ void *operator new(size_t size, const std::nothrow_t &) noexcept {
   if (allocationsLeft > 0) --allocationsLeft;
   return std::malloc(size == 0 ? 1 : size);
 }
-void operator delete(void *memory) noexcept {
+// Inlined beside a call of operator new, a free() would look like the wrong partner of it.
+[[gnu::noinline]] void operator delete(void *memory) noexcept {
   std::free(memory);
 }
-void operator delete(void *memory, size_t) noexcept {
+[[gnu::noinline]] void operator delete(void *memory, size_t) noexcept {
   std::free(memory);
 }
 
