@@ -45,11 +45,14 @@ int minimumMB(int pool) {
   return pool % 8 == 0 ? 1 : 0;
 }
 
+// As people write them: what is the default anyway is left out.
 void writeDefinitions(const fs::path &path, int pools) {
   std::ofstream file(path);
-  for (int i = 0; i < pools; ++i)
-    file << "- name: " << nameOf(i) << "\n  memMin: " << minimumMB(i)
-         << "\n  memMax: 64\n  cpuMax: 50\n  cpuShares: 2000\n";
+  for (int i = 0; i < pools; ++i) {
+    file << "- name: " << nameOf(i) << '\n';
+    if (minimumMB(i) != 0) file << "  memMin: " << minimumMB(i) << '\n';
+    file << "  memMax: 64\n  cpuMax: 50\n  cpuShares: 2000\n";
+  }
 }
 
 void writeParserConfiguration(const fs::path &path, int pools) {

@@ -15,14 +15,6 @@
 namespace Knob::Linux {
 namespace {
 
-// What one file of a group holds.
-struct Value {
-  Control control;
-  std::string text;
-};
-using Values = std::array<Value, 2>;
-
-// The two files of one resource.
 Values valuesOf(Resource resource, const Books &books, uint32_t cpus) {
   const int64_t reservation = reservationOf({books.allocation, books.childrenSum});
   const Allocation &allocation = books.allocation;
@@ -65,6 +57,12 @@ Record readFiles(const Group &group) {
   return record;
 }
 
+Record newRecord(const Group &group) {
+  Record record;
+  record.memory.allocation.max = *group.unrecordedMax;
+  return record;
+}
+
 bool isLower(int64_t max, int64_t than) {
   return max != -1 && (than == -1 || max < than);
 }
@@ -73,8 +71,20 @@ bool areEqual(const Allocation &a, const Allocation &b) {
   return a.min == b.min && a.max == b.max && a.minLimit == b.minLimit && a.shares == b.shares;
 }
 
+// Whether a new group with this memory allocation needs no record yet: its file says all of it.
+bool isMaximumAlone(const Allocation &memory) {
+  const Allocation none;
+  return memory.min == none.min && memory.minLimit == none.minLimit && memory.shares == none.shares;
+}
+
 [[noreturn]] void refuse(const std::string &where) {
   throw KernelError(Status::kReservationRefused, where + " has no room for this reservation");
+}
+
+Held fromAttribute(Group &group, const std::string &bytes) {
+  group.unrecordedMax.reset();
+  if (const auto record = decode(bytes)) return {*record, true, false};
+  return {readFiles(group), false, true};
 }
 
 const Record *storedIn(const Held &held) {
@@ -102,23 +112,62 @@ std::string textOf(const Deviation &deviation) {
 
 Held Bookkeeper::read(Group &group) const {
   const auto bytes = readAttribute(group.directory, kRecordAttribute);
-  if (!bytes) return {group.isFresh ? Record() : readFiles(group), false, false};
-  group.isFresh = false;
-  if (const auto record = decode(*bytes)) return {*record, true, false};
-  return {readFiles(group), false, true};
+  if (!bytes) return {readFiles(group), false, false};
+  return fromAttribute(group, *bytes);
+}
+
+// What this process itself gave a new group need not be read back.
+Held Bookkeeper::readToChange(Group &group) const {
+  const auto bytes = readAttribute(group.directory, kRecordAttribute);
+  if (bytes) return requireReadable(fromAttribute(group, *bytes));
+  return {group.unrecordedMax ? newRecord(group) : readFiles(group), false, false};
 }
 
 void Bookkeeper::change(Group &group, Resource resource, const AllocationChange &change) {
-  if (group.isFresh && !areEqual(changedAllocation({}, change), {})) {
-    // Most likely nobody has set anything of it yet, so its record is not looked for: making one
-    // fails when there is one. Only if this succeeds was it right.
-    try {
-      return changeHeld(group, {}, resource, change);
-    } catch (const KernelError &) {
-      group.isFresh = false;
-    }
+  try {
+    changeHeld(group, readToChange(group), resource, change);
+  } catch (const KernelError &error) {
+    // Its maker has given it a record just now.
+    if (error.status != Status::kExists) throw;
+    changeHeld(group, readToChange(group), resource, change);
   }
-  changeHeld(group, requireReadable(read(group)), resource, change);
+}
+
+bool Bookkeeper::changeNew(Group &group, const AllocationChange &change) {
+  if (!group.unrecordedMax) return false;
+  const Record before = newRecord(group);
+  Record after = before;
+  after.cpu.allocation = changedAllocation(before.cpu.allocation, change);
+  if (after.cpu.allocation.min != 0 || areEqual(after.cpu.allocation, before.cpu.allocation)) {
+    return false;
+  }
+  Writes writes(groups_);
+  try {
+    writeControls(writes, group, valuesOf(Resource::kCpu, before.cpu, facts_.cpus),
+                  valuesOf(Resource::kCpu, after.cpu, facts_.cpus));
+    writes.record(group, nullptr, after);
+  } catch (const KernelError &) {
+    return false;
+  }
+  writes.commit();
+  return true;
+}
+
+void Bookkeeper::recordNew(Group &group) noexcept {
+  if (!group.unrecordedMax || group.unrecordedMax == -1) return;
+  try {
+    writeRecord(group, newRecord(group), Attribute::kNew);
+  } catch (const std::exception &) {
+    // Somebody else has made it, or the group is gone.
+  }
+}
+
+void Bookkeeper::restoreCpuFiles(Group &group) {
+  const Held held = read(group);
+  if (!held.isStored) return;
+  for (const Value &value : valuesOf(Resource::kCpu, held.record.cpu, facts_.cpus)) {
+    groups_.write(group, value.control, value.text);
+  }
 }
 
 void Bookkeeper::changeHeld(Group &group, Held held, Resource resource,
@@ -127,7 +176,7 @@ void Bookkeeper::changeHeld(Group &group, Held held, Resource resource,
   const Allocation wanted = changedAllocation(current, change);
   if (held.record.savedHigh) restoreMemoryHigh(group, held.record);
   if (areEqual(wanted, current)) return groups_.requireAlive(group);
-  if (resource == Resource::kCpu && count(group, held)) held = requireReadable(read(group));
+  if (resource == Resource::kCpu && count(group, held)) held = readToChange(group);
   apply(group, held, resource, wanted);
 }
 
@@ -192,8 +241,8 @@ std::vector<Bookkeeper::Place> Bookkeeper::placesFrom(GroupPtr group, Resource r
                                                       int64_t before, int64_t after) {
   std::vector<Place> places;
   for (; group; group = groups_.parentOf(*group)) {
-    Held held = requireReadable(read(*group));
-    if (count(*group, held)) held = read(*group);
+    Held held = readToChange(*group);
+    if (count(*group, held)) held = readToChange(*group);
     const Books &books = held.record.books(resource);
     const int64_t sum = saturatedSum(books.childrenSum - before, after);
     places.push_back({group, held});
@@ -216,21 +265,35 @@ std::vector<Level> Bookkeeper::admitted(const Level &own, const std::vector<Plac
   return *answer;
 }
 
+// A directory takes records even when its group is gone; its files tell.
+void Bookkeeper::writeControls(Writes &writes, Group &group, const Values &from,
+                               const Values &to) const {
+  bool isAlive = false;
+  for (size_t i = 0; i < to.size(); ++i) {
+    writes.control(group, to[i].control, from[i].text, to[i].text);
+    isAlive = isAlive || from[i].text != to[i].text;
+  }
+  if (!isAlive) groups_.requireAlive(group);
+}
+
 void Bookkeeper::writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
                           const Allocation &wanted) const {
-  const bool isKnown = held.isStored || group.isFresh;
+  const bool isNew = !held.isStored && group.unrecordedMax;
   Record after = held.record;
   after.books(resource).allocation = wanted;
   after.peaks = raisedPeaks(after.peaks, after.memory.allocation.min, after.memory.childrenSum);
-  writes.record(group, storedIn(held), after);
-
-  const Values from = valuesOf(resource, held.record.books(resource), facts_.cpus);
   const Values to = valuesOf(resource, after.books(resource), facts_.cpus);
-  for (size_t i = 0; i < to.size(); ++i) {
-    const char *name = rowOf(to[i].control).name;
-    writes.control(group, to[i].control,
-                   isKnown ? from[i].text : readControl(group.directory, name), to[i].text);
+  Values from = valuesOf(resource, held.record.books(resource), facts_.cpus);
+  if (isNew && resource == Resource::kMemory && isMaximumAlone(wanted)) {
+    writeControls(writes, group, from, to);
+    group.unrecordedMax = wanted.max;
+    return;
   }
+  writes.record(group, storedIn(held), after);
+  if (!held.isStored && !isNew) {
+    for (Value &value : from) value.text = readControl(group.directory, rowOf(value.control).name);
+  }
+  writeControls(writes, group, from, to);
 }
 
 // levels: what admission made of the group that changes, then of those places that change.

@@ -2,7 +2,9 @@
 // sums and the protection of everything above in step. The caller holds the lock on the tree.
 #pragma once
 
+#include <array>
 #include <optional>
+#include <string>
 #include <vector>
 
 #include "knob/admission.h"
@@ -18,6 +20,14 @@ struct Held {
   bool isStored = false;
   bool isDamaged = false;  // there is a record that cannot be read
 };
+
+// What a control file holds.
+struct Value {
+  Control control;
+  std::string text;
+};
+// The two files of one resource.
+using Values = std::array<Value, 2>;
 
 // A control file that should hold something else.
 struct Deviation {
@@ -43,6 +53,18 @@ class Bookkeeper {
   // refused, memory busy.
   void change(Group &group, Resource resource, const AllocationChange &change);
 
+  // The first CPU settings of a group that this process made, without the lock: the files first,
+  // then the record, which cannot be made when there is one. False: this is not such a group or
+  // such a change, or somebody else or an error was in the way; the caller takes the lock, restores
+  // the CPU files and calls change(). Throws KernelError: bad parameter.
+  bool changeNew(Group &group, const AllocationChange &change);
+
+  // Makes the record of a new group that has been given something.
+  void recordNew(Group &group) noexcept;
+
+  // Writes what the record says, where there is one. Throws KernelError.
+  void restoreCpuFiles(Group &group);
+
   // Takes a deleted child's reservations out of its parent and all above. child: as it was.
   void releaseChild(Group &parent, const Held &child);
 
@@ -51,6 +73,7 @@ class Bookkeeper {
 
  private:
   struct Place;
+  Held readToChange(Group &group) const;
   void changeHeld(Group &group, Held held, Resource resource, const AllocationChange &change);
   // A group that somebody else gave a minimum, and that now gets a record, is one more reservation:
   // whether it was, and is counted now.
@@ -59,6 +82,7 @@ class Bookkeeper {
   std::vector<Place> placesFrom(GroupPtr group, Resource resource, int64_t before, int64_t after);
   std::vector<Level> admitted(const Level &own, const std::vector<Place> &above, Resource resource,
                               const Allocation &wanted) const;
+  void writeControls(Writes &writes, Group &group, const Values &from, const Values &to) const;
   void writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
                 const Allocation &wanted) const;
   void writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,

@@ -24,7 +24,7 @@ using Platform::UniqueFd;
 constexpr mode_t kDirectoryMode = 0755;
 // With five descriptors for each group at most, far from every process's limit. Room is made in
 // bulk, since closing in bulk is cheap.
-constexpr size_t kMostGroupsOpen = 24, kGroupsKept = 8;
+constexpr size_t kMostGroupsOpen = 48, kGroupsKept = 8;
 constexpr size_t kMostPathsKnown = 64;
 static_assert(sizeof(ino_t) == sizeof(GroupId), "an inode number is a group's id");
 
@@ -57,20 +57,7 @@ Groups::Groups(Hierarchy hierarchy) : hierarchy_(std::move(hierarchy)) {
 
 GroupPtr Groups::lookUp(std::string_view path) {
   const std::string text(path);
-  if (const auto known = paths_.find(text); known != paths_.end()) {
-    // Groups are never renamed: while the path still leads to this id, all that was checked when
-    // it was first looked up holds.
-    Identity identity;
-    const auto open = groups_.find(known->second);
-    if (open != groups_.end()) {
-      if (identify(hierarchy_.directory.get(), text.c_str(), identity) == 0 &&
-          identity.id == known->second) {
-        return find(identity.id);
-      }
-      groups_.erase(open);
-    }
-    paths_.erase(known);
-  }
+  if (GroupPtr group = openKnown(text)) return group;
   UniqueFd directory;
   const int error = openBeneath(hierarchy_.directory.get(), path, directory);
   if (statusOf(error) == Status::kNotFound) return {};
@@ -92,6 +79,23 @@ GroupPtr Groups::lookUp(std::string_view path) {
   const GroupPtr group = adopt(std::move(directory), identity.id);
   group->name = path.substr(path.rfind('/') + 1);
   return group;
+}
+
+// Groups are never renamed: while the path still leads to this id, all that was checked when it was
+// first looked up holds.
+GroupPtr Groups::openKnown(const std::string &path) {
+  const auto known = paths_.find(path);
+  if (known == paths_.end()) return {};
+  if (const auto open = groups_.find(known->second); open != groups_.end()) {
+    Identity identity;
+    if (identify(hierarchy_.directory.get(), path.c_str(), identity) == 0 &&
+        identity.id == known->second) {
+      return find(identity.id);
+    }
+    groups_.erase(open);
+  }
+  paths_.erase(known);
+  return {};
 }
 
 // Host cannot go while a group lives below it. So whatever was opened while it was this one is
@@ -175,7 +179,7 @@ GroupPtr Groups::makeIn(int parentDirectory, std::string_view name) {
   }
   const GroupPtr group = adopt(std::move(directory), identity.id);
   group->name = text;
-  group->isFresh = true;
+  group->unrecordedMax = -1;
   return group;
 }
 
@@ -231,6 +235,14 @@ void Groups::requireAlive(const Group &group) const {
 }
 
 bool Groups::isPopulated(Group &group) {
+  // Of many groups made in one, none needs its own file while nothing lives in any of them.
+  if (const auto parent = groups_.find(group.parent); group.events < 0 && parent != groups_.end()) {
+    if (!readPopulated(*parent->second)) return false;
+  }
+  return readPopulated(group);
+}
+
+bool Groups::readPopulated(Group &group) {
   if (group.events < 0) {
     UniqueFd file(::openat(group.directory, kEventsFile, O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
     if (!file) fail(errno, std::string("cannot open ") + kEventsFile + " of " + nameOf(group));

@@ -26,8 +26,10 @@ struct Group {
   std::string name;    // empty: not looked at yet
   int directory = -1;
   std::array<int, kControls.size()> controls = {-1, -1, -1, -1};  // opened for writing
-  int events = -1;        // cgroup.events, opened for reading
-  bool isFresh = false;   // this process made it, and nobody has set anything of it
+  int events = -1;  // cgroup.events, opened for reading
+  // Of a group that this process made, and that has no record as far as it knows: its memory
+  // maximum in MB, all that it has been given; -1: no limit.
+  std::optional<int64_t> unrecordedMax;
   bool passesOn = false;  // this process has seen to it that children get their controllers
   uint64_t lastUse = 0;
   DescriptorSet descriptors;  // owns all of the above
@@ -100,7 +102,9 @@ class Groups {
   void forget(GroupId id) { groups_.erase(id); }
 
  private:
+  GroupPtr openKnown(const std::string &path);
   GroupPtr makeIn(int parentDirectory, std::string_view name);
+  bool readPopulated(Group &group);
   void passOnToHost() const;
   GroupPtr adopt(Platform::UniqueFd directory, GroupId id);
   GroupPtr findUpwards(Platform::UniqueFd directory, GroupId id);

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <limits>
 #include <optional>
+#include <utility>
 
 #include "knob/linux/check.h"
 #include "knob/linux/control_values.h"
@@ -35,7 +36,12 @@ bool isFixed(const std::vector<std::string_view> &path) {
 KernelOnGroups::KernelOnGroups(Hierarchy hierarchy, uint32_t maxVms)
     : groups_(std::move(hierarchy)), facts_(factsWith(maxVms)), books_(groups_, facts_) {}
 
+KernelOnGroups::~KernelOnGroups() {
+  recordTheUnrecorded();
+}
+
 GroupId KernelOnGroups::lookUp(std::string_view path) {
+  recordTheUnrecorded();
   const auto components = splitPath(path);
   if (!components || components->front() != kRootName) notFound();
   GroupPtr group = groups_.lookUp(path);
@@ -49,7 +55,7 @@ GroupId KernelOnGroups::lookUp(std::string_view path) {
 
 GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
   if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
-  const GroupPtr above = groups_.find(parent);
+  const GroupPtr above = find(parent);
   groups_.passOn(*above);
   try {
     const GroupPtr group = groups_.make(*above, name);
@@ -63,10 +69,10 @@ GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
 }
 
 // Another process may have taken the controllers back since this one has seen them passed on. The
-// file that is opened to see that is the one that a change of settings needs first.
+// file that is opened to see that is the one that most pools set.
 void KernelOnGroups::requireControllers(Group &group, Group &parent) {
   try {
-    (void)groups_.open(group, Control::kMemoryMin);
+    (void)groups_.open(group, Control::kMemoryMax);
   } catch (const KernelError &error) {
     // Removed by somebody at once; that does not undo that it was made.
     if (error.status == Status::kNotFound) return;
@@ -78,7 +84,7 @@ void KernelOnGroups::requireControllers(Group &group, Group &parent) {
 void KernelOnGroups::remove(GroupId id) {
   const GroupPtr top = host();
   const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
-  const GroupPtr group = groups_.find(id);
+  const GroupPtr group = find(id);
   const GroupPtr parent = groups_.parentOf(*group);
   if (!parent || (parent->id == top->id && groups_.nameOf(*group) == kFixedChildName)) {
     throw KernelError(Status::kPermissionDenied, "the group is there for good");
@@ -90,7 +96,7 @@ void KernelOnGroups::remove(GroupId id) {
 }
 
 Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
-  const GroupPtr group = groups_.find(id);
+  const GroupPtr group = find(id);
   const Held held = books_.read(*group);
   groups_.requireAlive(*group);  // a directory keeps its attributes when it is gone
   return held.record.books(resource).allocation;
@@ -98,24 +104,30 @@ Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
 
 void KernelOnGroups::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
   const GroupPtr top = host();  // outlives the lock on its directory
+  const GroupPtr group = groups_.find(id);
+  if (group != unrecorded_) recordTheUnrecorded();
+  const bool isNew = resource == Resource::kCpu && group->unrecordedMax;
+  if (isNew && books_.changeNew(*group, change)) return;
   const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
-  books_.change(*groups_.find(id), resource, change);
+  if (isNew) books_.restoreCpuFiles(*group);
+  books_.change(*group, resource, change);
+  if (group->unrecordedMax) unrecorded_ = group;
 }
 
 std::vector<GroupId> KernelOnGroups::childGroups(GroupId id) {
   std::vector<GroupId> ids;
-  for (const Child &child : groups_.children(*groups_.find(id))) ids.push_back(child.id);
+  for (const Child &child : groups_.children(*find(id))) ids.push_back(child.id);
   return ids;
 }
 
 std::vector<int64_t> KernelOnGroups::members(GroupId id) {
-  return readMembers(*groups_.find(id));
+  return readMembers(*find(id));
 }
 
 void KernelOnGroups::join(GroupId id, int64_t pid) {
   const GroupPtr top = host();
   const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
-  const GroupPtr group = groups_.find(id);
+  const GroupPtr group = find(id);
   if (groups_.hasChildren(*group)) {
     groups_.requireAlive(*group);
     throw KernelError(Status::kBusy, "child groups are in it");
@@ -124,7 +136,7 @@ void KernelOnGroups::join(GroupId id, int64_t pid) {
 }
 
 MemoryStatistics KernelOnGroups::memoryStatistics(GroupId id) {
-  const GroupPtr group = groups_.find(id);
+  const GroupPtr group = find(id);
   const Held held = books_.read(*group);
   groups_.requireAlive(*group);
   return held.record.peaks;
@@ -137,7 +149,7 @@ BuildSignature KernelOnGroups::signature() {
 GroupView KernelOnGroups::view(GroupId id) {
   const GroupPtr top = host();
   const TreeLock lock(top->directory, TreeLock::Kind::kShared);
-  const GroupPtr group = groups_.find(id);
+  const GroupPtr group = find(id);
   const Held held = books_.read(*group);
   groups_.requireAlive(*group);
 
@@ -165,11 +177,22 @@ GroupView KernelOnGroups::view(GroupId id) {
 }
 
 std::vector<Finding> KernelOnGroups::check(bool repair) {
+  recordTheUnrecorded();
   makeFixedGroups(groups_);
   const GroupPtr top = host();
   const TreeLock lock(top->directory,
                       repair ? TreeLock::Kind::kExclusive : TreeLock::Kind::kShared);
   return checkTree(groups_, books_, facts_, repair);
+}
+
+GroupPtr KernelOnGroups::find(GroupId id) {
+  recordTheUnrecorded();
+  return groups_.find(id);
+}
+
+// Most often the next call sets the group's CPU, and makes the record in passing.
+void KernelOnGroups::recordTheUnrecorded() noexcept {
+  if (const GroupPtr group = std::exchange(unrecorded_, nullptr)) books_.recordNew(*group);
 }
 
 // Every id that a caller can have came from a look-up below it, so it is there.

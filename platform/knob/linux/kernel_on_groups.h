@@ -15,6 +15,9 @@ namespace Knob::Linux {
 class KernelOnGroups : public Kernel {
  public:
   KernelOnGroups(Hierarchy hierarchy, uint32_t maxVms);
+  ~KernelOnGroups() override;
+  KernelOnGroups(const KernelOnGroups &) = delete;
+  KernelOnGroups &operator=(const KernelOnGroups &) = delete;
 
   GroupId lookUp(std::string_view path) override;
   GroupId create(GroupId parent, std::string_view name) override;
@@ -32,11 +35,14 @@ class KernelOnGroups : public Kernel {
 
  private:
   GroupPtr host();
+  GroupPtr find(GroupId id);
+  void recordTheUnrecorded() noexcept;
   void requireControllers(Group &group, Group &parent);
 
   Groups groups_;
   const HostFacts facts_;
   Bookkeeper books_;
+  GroupPtr unrecorded_;  // the last call gave this new group a maximum; its record is still to come
 };
 
 }  // namespace Knob::Linux

@@ -64,7 +64,6 @@ void addMember(Group &group, int64_t pid) {
   }
   if (error != 0) fail(error, "cannot move process " + text);
   if (!isAlive(text)) throw KernelError(Status::kNotFound, "no such process");
-  group.isFresh = false;
 }
 
 }  // namespace Knob::Linux

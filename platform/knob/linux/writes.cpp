@@ -34,7 +34,7 @@ void Writes::control(Group &group, Control control, const std::string &before,
 void writeRecord(Group &group, const Record &record, Attribute kind) {
   const RecordBytes bytes = encode(record);
   writeAttribute(group.directory, kRecordAttribute, {bytes.data(), bytes.size()}, kind);
-  group.isFresh = false;
+  group.unrecordedMax.reset();
 }
 
 }  // namespace Knob::Linux

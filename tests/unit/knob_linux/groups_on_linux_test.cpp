@@ -127,6 +127,12 @@ class OnLinux : public testing::Test {
     change.max = max;
     kernel_->setAllocation(id, Resource::kMemory, change);
   }
+  void setCpu(GroupId id, int64_t max, int64_t shares) {
+    AllocationChange change;
+    change.max = max;
+    change.shares = shares;
+    kernel_->setAllocation(id, Resource::kCpu, change);
+  }
   void setCpuMin(GroupId id, int64_t min) {
     AllocationChange change;
     change.min = min;
@@ -284,7 +290,7 @@ TEST_F(OnLinux, ARecordTakenOffAGroupWithReservationsBelowIsFoundAndMadeAnew) {
 
 TEST_F(OnLinux, AMemoryHighThatADeadProcessLeftLoweredIsPutBack) {
   const GroupId id = create("host/opt", "pool");
-  setMemory(id, 0, 100);
+  setMemory(id, 1, 100);
   Record record = *decode(attribute("host/opt/pool", kRecordAttribute));
   record.savedHigh = uint64_t{64} << 20;
   const RecordBytes bytes = encode(record);
@@ -294,11 +300,11 @@ TEST_F(OnLinux, AMemoryHighThatADeadProcessLeftLoweredIsPutBack) {
     if (byRepair) {
       EXPECT_EQ(check(true).size(), 1U);
     } else {
-      setMemory(id, 1, 100);
+      setMemory(id, 2, 100);
     }
     EXPECT_EQ(fileText("host/opt/pool", "memory.high"), "67108864");
     EXPECT_FALSE(decode(attribute("host/opt/pool", kRecordAttribute))->savedHigh);
-    setMemory(id, 0, 100);
+    setMemory(id, 1, 100);
   }
   EXPECT_TRUE(check(false).empty());
 }
@@ -560,6 +566,84 @@ TEST_F(OnLinux, WhatAnotherProcessSetOfANewGroupIsNotLost) {
   EXPECT_EQ(memory.min, 40);
   EXPECT_EQ(fileText("host", "memory.min"), "41943040");
   EXPECT_TRUE(check(false).empty());
+}
+
+// ---- a new group, which gets its record only with the first setting that no file holds
+
+TEST_F(OnLinux, AMaximumAloneIsRecordedWithTheCpuSettingsThatFollow) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "104857600");
+  EXPECT_EQ(attribute("host/opt/pool", kRecordAttribute), "");
+  EXPECT_EQ(open()->readAllocation(id, Resource::kMemory).max, 100);
+  setCpu(id, 50, 2000);
+  EXPECT_EQ(attribute("host/opt/pool", kRecordAttribute).size(), kRecordSize);
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.max"), "50000 100000");
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.weight"), "200");
+  write("host/opt/pool", "memory.max", "max");
+  EXPECT_THAT(check(false),
+              testing::ElementsAre("host/opt/pool: memory.max is max, not 104857600"));
+}
+
+TEST_F(OnLinux, AMaximumAloneIsRecordedByTheNextCallOrTheEndOfTheProcess) {
+  for (const bool isEnd : {false, true}) {
+    const GroupId id = create("host/opt", isEnd ? "ended" : "called");
+    setMemory(id, 0, 100);
+    if (isEnd) kernel_ = open();
+    write(isEnd ? "host/opt/ended" : "host/opt/called", "memory.max", "max");
+    EXPECT_EQ(check(true).size(), 1U);
+    EXPECT_EQ(fileText(isEnd ? "host/opt/ended" : "host/opt/called", "memory.max"), "104857600");
+  }
+}
+
+TEST_F(OnLinux, WhatAnotherProcessSetOfTheMemoryOfANewGroupStaysWhenItsMakerSetsTheCpu) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  AllocationChange limit;
+  limit.max = 60;
+  open()->setAllocation(id, Resource::kMemory, limit);
+  setCpu(id, 50, 2000);
+  EXPECT_EQ(kernel_->readAllocation(id, Resource::kMemory).max, 60);
+  EXPECT_EQ(kernel_->readAllocation(id, Resource::kCpu).max, 50);
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "62914560");
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.max"), "50000 100000");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, WhatAnotherProcessSetOfTheCpuOfANewGroupCountsWhenItsMakerIsRefused) {
+  const GroupId id = create("host/opt", "pool");
+  const auto other = open();
+  AllocationChange reserved;
+  reserved.min = 60;
+  reserved.max = 80;
+  other->setAllocation(id, Resource::kCpu, reserved);
+  AllocationChange tooLow;
+  tooLow.max = 50;
+  EXPECT_EQ(statusOfCall([&] { kernel_->setAllocation(id, Resource::kCpu, tooLow); }),
+            Status::kBadParameter);
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.max"), "80000 100000");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ANewGroupThatSomebodyElseFilledIsBusyForALowerMaximum) {
+  const GroupId id = create("host/opt", "pool");
+  const Member member("host/opt/pool", 40);
+  EXPECT_EQ(statusOfCall([&] { setMemory(id, 0, 10); }), Status::kMemoryBusy);
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "max");
+  EXPECT_THAT(fileText("host/opt/pool", "memory.events"), HasSubstr("oom_kill 0"));
+}
+
+TEST_F(OnLinux, ANewGroupThatSomebodyElseRemovedTakesNoSettings) {
+  for (const bool isCpu : {false, true}) {
+    const GroupId id = create("host/opt", "pool");
+    open()->remove(id);
+    AllocationChange shares;
+    shares.shares = 1000;
+    EXPECT_EQ(statusOfCall([&] {
+                kernel_->setAllocation(id, isCpu ? Resource::kCpu : Resource::kMemory, shares);
+              }),
+              Status::kNotFound);
+  }
 }
 
 TEST_F(OnLinux, SettingANewGroupBackToItsDefaultsUndoesWhatAnotherProcessSet) {
