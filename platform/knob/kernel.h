@@ -93,7 +93,9 @@ class Kernel {
   // The group of that path, looked up component by component. Not found.
   virtual GroupId lookUp(std::string_view path) = 0;
 
-  // Makes a group with the default allocations. Bad parameter (name), not found (parent), exists.
+  // Makes a group with the default allocations. Bad parameter (name), not found (parent), exists,
+  // busy (living members in the parent), out of memory (the parent, or a group above it, may have
+  // none).
   virtual GroupId create(GroupId parent, std::string_view name) = 0;
 
   // Not found; busy (child groups or living members); permission denied (the two fixed groups).
@@ -110,7 +112,8 @@ class Kernel {
   // The process ids of the living members.
   virtual std::vector<int64_t> members(GroupId id) = 0;
 
-  // Moves a process into a group. Not found (group or process), busy (the group has child groups).
+  // Moves a process into a group. Not found (group or process), busy (the group has child groups),
+  // out of memory (the group, or one above it, may have none: the process could not live there).
   virtual void join(GroupId id, int64_t pid) = 0;
 
   virtual MemoryStatistics memoryStatistics(GroupId id) = 0;

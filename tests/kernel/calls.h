@@ -16,6 +16,7 @@ inline constexpr KNOB_ReturnStatus kNotFound = 0x0BAD0003;
 inline constexpr KNOB_ReturnStatus kBusy = 0x0BAD0004;
 inline constexpr KNOB_ReturnStatus kExists = 0x0BAD0005;
 inline constexpr KNOB_ReturnStatus kBadParameter = 0x0BAD0007;
+inline constexpr KNOB_ReturnStatus kOutOfMemory = 0x0BAD0014;
 inline constexpr KNOB_ReturnStatus kPermissionDenied = 0x0BAD0043;
 inline constexpr KNOB_ReturnStatus kMemoryBusy = 0x0BAD0080;
 inline constexpr KNOB_ReturnStatus kReservationRefused = 0x0BAD0081;

@@ -89,6 +89,36 @@ TEST_F(Members, AGroupWithAMemberTakesNoChildGroups) {
   EXPECT_EQ(create(id, "child").status, kSuccess);
 }
 
+TEST_F(Members, AGroupThatMayHaveNoMemoryTakesNoProcesses) {
+  const int64_t id = newGroup("host/opt", "pool");
+  ASSERT_EQ(setMemory(id, {"max=0"}), kSuccess);
+  HeldProcess process;
+  EXPECT_EQ(join(id, process.pid()), kOutOfMemory);
+  EXPECT_EQ(countMembers(id).value, 0);
+  ASSERT_EQ(setMemory(id, {"max=-1"}), kSuccess);
+  EXPECT_EQ(join(id, process.pid()), kSuccess);
+}
+
+TEST_F(Members, AGroupBelowOneThatMayHaveNoMemoryTakesNoProcesses) {
+  const int64_t above = newGroup("host/opt", "above");
+  newGroup("host/opt/above", "middle");
+  const int64_t below = newGroup("host/opt/above/middle", "below");
+  ASSERT_EQ(setMemory(above, {"max=0"}), kSuccess);
+  HeldProcess process;
+  EXPECT_EQ(join(below, process.pid()), kOutOfMemory);
+  EXPECT_EQ(countMembers(below).value, 0);
+}
+
+TEST_F(Members, WhatIsNoProcessIsNotAskedOfAGroupWithoutMemory) {
+  const int64_t id = newGroup("host/opt", "pool");
+  ASSERT_EQ(setMemory(id, {"max=0"}), kSuccess);
+  EXPECT_EQ(join(id, 0), kOutOfMemory);
+  newGroup("host/opt", "parent");
+  newGroup("host/opt/parent", "child");
+  ASSERT_EQ(setMemory(idOf("host/opt/parent"), {"max=0"}), kSuccess);
+  EXPECT_EQ(join(idOf("host/opt/parent"), 0), kBusy) << "its child groups come first";
+}
+
 constexpr int kHeldMB = 64;
 
 TEST_F(MemoryInUse, AMaxBelowItIsBusyAndChangesNothing) {

@@ -69,6 +69,21 @@ TEST_F(Tree, OneNameMayBeUsedUnderTwoParents) {
   EXPECT_NE(newGroup("host/opt/a", "same"), newGroup("host/opt/b", "same"));
 }
 
+TEST_F(Tree, BelowAGroupThatMayHaveNoMemoryNoneIsMade) {
+  const int64_t above = newGroup("host/opt", "above");
+  const int64_t below = newGroup("host/opt/above", "below");
+  ASSERT_EQ(setMemory(above, {"max=0"}), kSuccess);
+  for (const int64_t parent : {above, below}) {
+    const auto made = create(parent, "pool");
+    EXPECT_EQ(made.status, kOutOfMemory);
+    EXPECT_EQ(made.value, -1) << "the output is untouched";
+  }
+  EXPECT_EQ(create(above, "below").status, kExists) << "what is there is told first";
+  EXPECT_EQ(create(above, "..").status, kBadParameter);
+  ASSERT_EQ(setMemory(above, {"max=1000"}), kSuccess);
+  EXPECT_EQ(create(below, "pool").status, kSuccess);
+}
+
 TEST_F(Tree, ASecondGroupOfOneNameIsRefusedAndTheFirstStays) {
   const int64_t first = newGroup("host/opt", "pool");
   ASSERT_EQ(setMemory(first, {"min=5"}), kSuccess);

@@ -70,7 +70,6 @@ class Sequence {
       line << number << '.' << step << ' ';
       const Knob::Status status = doOne(line);
       paths_.clear();
-      disabled_.clear();
       const std::string tree = treeOf("", kernel_.lookUp("host"));
       std::sort(paths_.begin(), paths_.end());
       line << " -> " << std::hex << static_cast<uint32_t>(status) << " tree "
@@ -169,16 +168,7 @@ class Sequence {
     }
   }
 
-  // A new group costs the groups above it some of the kernel's own memory, which one that may have
-  // none cannot give.
-  bool hasNoMemory(const std::string &path) {
-    return std::any_of(disabled_.begin(), disabled_.end(), [&](const std::string &group) {
-      return path.compare(0, group.size(), group) == 0;
-    });
-  }
-
   Knob::Status create(const std::string &path, const std::string &name, std::ostream &out) {
-    if (hasNoMemory(path)) return remove(path, out);
     out << "create '" << path << "' '" << name << "'";
     return statusOf([&] {
       const GroupId id = kernel_.create(kernel_.lookUp(path), name);
@@ -213,8 +203,6 @@ class Sequence {
         sleepers_[which].die();
         return Knob::Status::kSuccess;
       default:
-        // There it would end with its next page: the group may have none.
-        if (hasNoMemory(path)) return remove(path, out);
         out << "join '" << path << "' " << which;
         return statusOf([&] { kernel_.join(kernel_.lookUp(path), sleepers_[which].start()); });
     }
@@ -231,7 +219,6 @@ class Sequence {
     const Knob::MemoryStatistics peaks = kernel_.memoryStatistics(id);
     const std::string path = parent.empty() ? view.name : parent + "/" + view.name;
     paths_.push_back(path);
-    if (view.memory.max == 0) disabled_.push_back(path);
     std::ostringstream out;
     out << "  " << path;
     print(kernel_.readAllocation(id, Resource::kMemory), out);
@@ -261,8 +248,7 @@ class Sequence {
   Kernel &kernel_;
   std::minstd_rand random_;
   bool showTrees_;
-  std::vector<std::string> paths_;     // of the groups that are there
-  std::vector<std::string> disabled_;  // those of them that may have no memory
+  std::vector<std::string> paths_;  // of the groups that are there
   Sleeper sleepers_[kProcesses];
 };
 

@@ -15,6 +15,7 @@ namespace {
 
 constexpr KNOB_ReturnStatus kNotFound = 0x0BAD0003;
 constexpr KNOB_ReturnStatus kBusy = 0x0BAD0004;
+constexpr KNOB_ReturnStatus kOutOfMemory = 0x0BAD0014;
 
 [[noreturn]] void refuse(const std::string &path, const char *reason) {
   throw std::runtime_error(path + ": " + reason);
@@ -48,8 +49,8 @@ int64_t memoryMaxMB(const std::string &path) {
   return max;
 }
 
-// A process in a group that may have no memory is killed as soon as it needs any, without a word.
-void requireMemory(const std::string &path) {
+// Says which group it is that may have no memory, if there is one still.
+void refuseDisabled(const std::string &path) {
   for (size_t end = path.find('/'); end != std::string::npos; end = path.find('/', end + 1)) {
     const std::string above = path.substr(0, end);
     if (memoryMaxMB(above) == 0)
@@ -66,7 +67,6 @@ std::string groupPath(const std::string &pool) {
 
 void joinGroup(const std::string &path) {
   const int64_t id = lookUp(path);
-  requireMemory(path);
   const ParamList instance(ParamList::Kind::kInstance, 1);
   const ParamList input(ParamList::Kind::kInput, 1);
   KNOB_ReturnStatus status = KNOB_ParamListAddInt(instance.get(), id);
@@ -77,6 +77,7 @@ void joinGroup(const std::string &path) {
   }
   if (status == kNotFound) refuse(path, "the pool was unloaded in this moment");
   if (status == kBusy) refuse(path, "the pool has pools below it, so it takes no processes itself");
+  if (status == kOutOfMemory) refuseDisabled(path);
   if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
 }
 

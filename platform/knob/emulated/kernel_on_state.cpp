@@ -101,6 +101,7 @@ GroupId KernelOnState::create(GroupId parent, std::string_view name) {
     if (!livingMembers(parent).empty()) {
       throw KernelError(Status::kBusy, "processes are in the parent group");
     }
+    requireAnyMemory(parent);
     return store().add(parent, name);
   });
 }
@@ -160,6 +161,7 @@ void KernelOnState::join(GroupId id, int64_t pid) {
   transact(Kind::kWrite, [&] {
     if (!store().exists(id)) notFound();
     if (store().hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
+    requireAnyMemory(id);
     const auto started = processStart(pid);
     if (!started) throw KernelError(Status::kNotFound, "no living process of that id");
     // Here a write is due anyway, so that what is left of the dead goes with it.
@@ -268,6 +270,16 @@ std::vector<Member> KernelOnState::livingBelow(GroupId id) {
 bool KernelOnState::isBelow(GroupId id, GroupId ancestor) {
   while (id != 0 && id != ancestor) id = store().parentOf(id);
   return id == ancestor;
+}
+
+// A group that may have none has none for its child groups and processes either.
+void KernelOnState::requireAnyMemory(GroupId id) {
+  for (ResourceRow row; id != 0; id = row.parent) {
+    row = require(id, Resource::kMemory);
+    if (row.level.allocation.max == 0) {
+      throw KernelError(Status::kOutOfMemory, "the group, or one above it, may have no memory");
+    }
+  }
 }
 
 void KernelOnState::requireMemoryFor(GroupId id, int64_t maxMB) {

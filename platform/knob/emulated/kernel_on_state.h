@@ -51,6 +51,7 @@ class KernelOnState final : public Kernel {
   std::vector<Member> livingMembers(GroupId id);
   std::vector<Member> livingBelow(GroupId id);
   bool isBelow(GroupId id, GroupId ancestor);
+  void requireAnyMemory(GroupId id);
   void requireMemoryFor(GroupId id, int64_t maxMB);
 
   // Everything that an open state needs, opened with the first operation that asks for it.

@@ -30,7 +30,8 @@ struct Group {
   // Of a group that this process made, and that has no record as far as it knows: its memory
   // maximum in MB, all that it has been given; -1: no limit.
   std::optional<int64_t> unrecordedMax;
-  bool passesOn = false;  // this process has seen to it that children get their controllers
+  bool passesOn = false;   // this process has seen to it that children get their controllers
+  bool hasMemory = false;  // this process has seen that its memory maximum is not 0
   uint64_t lastUse = 0;
   DescriptorSet descriptors;  // owns all of the above
 };

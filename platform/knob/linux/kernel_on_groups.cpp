@@ -58,9 +58,7 @@ GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
   const GroupPtr above = find(parent);
   groups_.passOn(*above);
   try {
-    const GroupPtr group = groups_.make(*above, name);
-    requireControllers(*group, *above);
-    return group->id;
+    return makeIn(above, name);
   } catch (const KernelError &) {
     // A group that got no child still takes processes.
     groups_.takeBack(*above);
@@ -68,17 +66,21 @@ GroupId KernelOnGroups::create(GroupId parent, std::string_view name) {
   }
 }
 
-// Another process may have taken the controllers back since this one has seen them passed on. The
-// file that is opened to see that is the one that most pools set.
-void KernelOnGroups::requireControllers(Group &group, Group &parent) {
+GroupId KernelOnGroups::makeIn(const GroupPtr &parent, std::string_view name) {
+  const GroupPtr group = groups_.make(*parent, name);
   try {
-    (void)groups_.open(group, Control::kMemoryMax);
+    // Linux itself refuses it most often, but not while it has some memory at hand.
+    requireAnyMemory(parent, Seen::kCounts);
+    // Another process may have taken the controllers back since this one has seen them passed on.
+    // The file that shows it is the one that most pools set.
+    (void)groups_.open(*group, Control::kMemoryMax);
   } catch (const KernelError &error) {
     // Removed by somebody at once; that does not undo that it was made.
-    if (error.status == Status::kNotFound) return;
-    groups_.remove(group, parent);
+    if (error.status == Status::kNotFound) return group->id;
+    groups_.remove(*group, *parent);
     throw;
   }
+  return group->id;
 }
 
 void KernelOnGroups::remove(GroupId id) {
@@ -110,6 +112,7 @@ void KernelOnGroups::setAllocation(GroupId id, Resource resource, const Allocati
   if (isNew && books_.changeNew(*group, change)) return;
   const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
   if (isNew) books_.restoreCpuFiles(*group);
+  group->hasMemory = false;
   books_.change(*group, resource, change);
   if (group->unrecordedMax) unrecorded_ = group;
 }
@@ -132,7 +135,20 @@ void KernelOnGroups::join(GroupId id, int64_t pid) {
     groups_.requireAlive(*group);
     throw KernelError(Status::kBusy, "child groups are in it");
   }
+  // Linux would take the process, and kill it as soon as it needs a page.
+  requireAnyMemory(group, Seen::kMayHaveChanged);
   addMember(*group, pid);
+}
+
+// The group itself and all above it may have some memory.
+void KernelOnGroups::requireAnyMemory(GroupPtr group, Seen seen) {
+  for (; group; group = groups_.parentOf(*group)) {
+    if (group->hasMemory && seen == Seen::kCounts) continue;
+    group->hasMemory = readControlIfAny(group->directory, rowOf(Control::kMemoryMax).name) != "0";
+    if (!group->hasMemory) {
+      throw KernelError(Status::kOutOfMemory, "the group, or one above it, may have no memory");
+    }
+  }
 }
 
 MemoryStatistics KernelOnGroups::memoryStatistics(GroupId id) {

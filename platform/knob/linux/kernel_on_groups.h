@@ -36,8 +36,11 @@ class KernelOnGroups : public Kernel {
  private:
   GroupPtr host();
   GroupPtr find(GroupId id);
+  GroupId makeIn(const GroupPtr &parent, std::string_view name);
   void recordTheUnrecorded() noexcept;
-  void requireControllers(Group &group, Group &parent);
+  // Whether what this process saw of a maximum before is enough, or others may have changed it.
+  enum class Seen { kCounts, kMayHaveChanged };
+  void requireAnyMemory(GroupPtr group, Seen seen);
 
   Groups groups_;
   const HostFacts facts_;
