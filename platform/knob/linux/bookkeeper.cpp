@@ -7,25 +7,13 @@
 #include <limits>
 
 #include "knob/allocation.h"
-#include "knob/linux/control_values.h"
+#include "knob/linux/file_values.h"
 #include "knob/linux/memory_lowering.h"
 #include "knob/linux/writes.h"
 #include "knob/peaks.h"
 
 namespace Knob::Linux {
 namespace {
-
-Values valuesOf(Resource resource, const Books &books, uint32_t cpus) {
-  const int64_t reservation = reservationOf({books.allocation, books.childrenSum});
-  const Allocation &allocation = books.allocation;
-  if (resource == Resource::kMemory) {
-    return {Value{Control::kMemoryMin, memoryText(reservation)},
-            Value{Control::kMemoryMax, memoryText(allocation.max)}};
-  }
-  return {
-      Value{Control::kCpuWeight, std::to_string(cpuWeight(allocation.shares, reservation, cpus))},
-      Value{Control::kCpuMax, cpuMaxText(allocation.max)}};
-}
 
 // A record that cannot be read may be a newer library's: it is not written over in passing.
 const Held &requireReadable(const Held &held) {
@@ -34,27 +22,6 @@ const Held &requireReadable(const Held &held) {
                       "the group's record is damaged or of another version; see knobctl check");
   }
   return held;
-}
-
-uint64_t limitIn(const Group &group, Control control) {
-  const auto text = readControlIfAny(group.directory, rowOf(control).name);
-  const uint64_t fresh = parseLimit(rowOf(control).fresh).value_or(0);
-  return text ? parseLimit(*text).value_or(fresh) : fresh;
-}
-
-// The nearest that our settings can express. No file tells a CPU minimum.
-Record readFiles(const Group &group) {
-  Record record;
-  record.memory.allocation.min = minimumMegabytes(limitIn(group, Control::kMemoryMin));
-  record.memory.allocation.max = maximumMegabytes(limitIn(group, Control::kMemoryMax));
-  record.cpu.allocation.shares = sharesOfWeight(limitIn(group, Control::kCpuWeight));
-  const auto bandwidth = readControlIfAny(group.directory, rowOf(Control::kCpuMax).name);
-  constexpr int64_t kMostPercent = std::numeric_limits<int32_t>::max();
-  if (bandwidth) {
-    record.cpu.allocation.max = std::min(parseCpuMax(*bandwidth).value_or(-1), kMostPercent);
-  }
-  record.peaks = raisedPeaks({}, record.memory.allocation.min, 0);
-  return record;
 }
 
 Record newRecord(const Group &group) {

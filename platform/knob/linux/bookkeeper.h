@@ -2,12 +2,12 @@
 // sums and the protection of everything above in step. The caller holds the lock on the tree.
 #pragma once
 
-#include <array>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "knob/admission.h"
+#include "knob/linux/file_values.h"
 #include "knob/linux/groups.h"
 #include "knob/linux/record.h"
 #include "knob/linux/writes.h"
@@ -20,14 +20,6 @@ struct Held {
   bool isStored = false;
   bool isDamaged = false;  // there is a record that cannot be read
 };
-
-// What a control file holds.
-struct Value {
-  Control control;
-  std::string text;
-};
-// The two files of one resource.
-using Values = std::array<Value, 2>;
 
 // A control file that should hold something else.
 struct Deviation {

@@ -49,4 +49,8 @@ void fail(int error, const std::string &what) {
   fail(statusOf(error), error, what);
 }
 
+void noSuchGroup() {
+  throw KernelError(Status::kNotFound, "no such group");
+}
+
 }  // namespace Knob::Linux

@@ -16,4 +16,6 @@ Status statusOf(int error) noexcept;
 // The same with a status that the call alone cannot tell.
 [[noreturn]] void fail(Status status, int error, const std::string &what);
 
+[[noreturn]] void noSuchGroup();
+
 }  // namespace Knob::Linux

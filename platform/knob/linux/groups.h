@@ -107,6 +107,7 @@ class Groups {
   GroupPtr makeIn(int parentDirectory, std::string_view name);
   bool readPopulated(Group &group);
   void passOnToHost() const;
+  static int keep(Group &group, Platform::UniqueFd file);
   GroupPtr adopt(Platform::UniqueFd directory, GroupId id);
   GroupPtr findUpwards(Platform::UniqueFd directory, GroupId id);
   GroupPtr findByWalking(GroupId id);

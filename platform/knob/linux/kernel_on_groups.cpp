@@ -17,10 +17,6 @@
 namespace Knob::Linux {
 namespace {
 
-[[noreturn]] void notFound() {
-  throw KernelError(Status::kNotFound, "no such group");
-}
-
 HostFacts factsWith(uint32_t maxVms) {
   HostFacts facts = readMachineFacts();
   facts.maxVms = maxVms;
@@ -43,13 +39,13 @@ KernelOnGroups::~KernelOnGroups() {
 GroupId KernelOnGroups::lookUp(std::string_view path) {
   recordTheUnrecorded();
   const auto components = splitPath(path);
-  if (!components || components->front() != kRootName) notFound();
+  if (!components || components->front() != kRootName) noSuchGroup();
   GroupPtr group = groups_.lookUp(path);
   if (!group && isFixed(*components)) {
     makeFixedGroups(groups_);
     group = groups_.lookUp(path);
   }
-  if (!group) notFound();
+  if (!group) noSuchGroup();
   return group->id;
 }
 
@@ -216,7 +212,7 @@ GroupPtr KernelOnGroups::host() {
   if (const GroupPtr group = groups_.openHost()) return group;
   makeFixedGroups(groups_);
   if (const GroupPtr group = groups_.host()) return group;
-  notFound();
+  noSuchGroup();
 }
 
 }  // namespace Knob::Linux
