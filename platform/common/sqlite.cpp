@@ -37,14 +37,15 @@ int waitForOthers(void *busyMs, int round) {
   const bool brief = round < kShortRounds;
   const int64_t waitedUs =
       brief ? round * kShortUs : kShortRounds * kShortUs + (round - kShortRounds) * kLongUs;
-  if (waitedUs >= reinterpret_cast<intptr_t>(busyMs) * 1000) return 0;
+  if (waitedUs >= int64_t{*static_cast<const int *>(busyMs)} * 1000) return 0;
   std::this_thread::sleep_for(std::chrono::microseconds(brief ? kShortUs : kLongUs));
   return 1;
 }
 
 }  // namespace
 
-Database::Database(const std::string &path, Mode mode, int busyMs) {
+Database::Database(const std::string &path, Mode mode, int busyMs)
+    : busyMs_(std::make_unique<int>(busyMs)) {
   int flags = SQLITE_OPEN_NOMUTEX;
   switch (mode) {
     case Mode::kReadOnly:
@@ -66,7 +67,7 @@ Database::Database(const std::string &path, Mode mode, int busyMs) {
   handle_.reset(handle);  // SQLite hands out a handle to close even when it could not open
   if (result != SQLITE_OK) fail(result);
   sqliteLibrary().extended_result_codes(handle, 1);
-  sqliteLibrary().busy_handler(handle, waitForOthers, reinterpret_cast<void *>(intptr_t{busyMs}));
+  sqliteLibrary().busy_handler(handle, waitForOthers, busyMs_.get());
 }
 
 void Database::execute(const char *sql) {

@@ -48,6 +48,7 @@ class Database {
   struct Closer {
     void operator()(sqlite3 *handle) const { sqliteLibrary().close(handle); }
   };
+  std::unique_ptr<int> busyMs_;  // SQLite knows where it stands as long as the handle lives
   std::unique_ptr<sqlite3, Closer> handle_;
 };
 

@@ -15,6 +15,7 @@ namespace Platform {
                   row(open_v2) row(prepare_v3) row(reset) row(step)
 
 struct SqliteLibrary {
+// NOLINTNEXTLINE(bugprone-macro-parentheses): the name of a member takes none
 #define PLATFORM_SQLITE_MEMBER(name) decltype(&sqlite3_##name) name;
   PLATFORM_SQLITE_FUNCTIONS(PLATFORM_SQLITE_MEMBER)
 #undef PLATFORM_SQLITE_MEMBER

@@ -28,7 +28,7 @@ bool runsUnderHypervisor() {
 }
 
 std::string bootCommandLine() {
-  constexpr size_t kMostBytes = 64 * 1024;
+  constexpr size_t kMostBytes = size_t{64} * 1024;
   try {
     std::string line = Platform::readFile("/proc/cmdline", kMostBytes);
     if (!line.empty() && line.back() == '\n') line.pop_back();

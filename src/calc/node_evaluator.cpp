@@ -12,7 +12,7 @@ namespace Calc {
 namespace {
 
 float evaluateScalar(const YAML::Node &node, const VariableTable &variables) {
-  const std::string text = node.Scalar();
+  const std::string &text = node.Scalar();
   try {
     return Evaluate(text, variables);
   } catch (const Exception &fault) {

@@ -5,6 +5,7 @@
 
 #include <CLI/CLI.hpp>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 #include <exception>
 #include <iostream>
@@ -39,9 +40,8 @@ int findSeparator(int argc, char **argv) {
   return at;
 }
 
-}  // namespace
-
-int main(int argc, char **argv) {
+// Answers only when the command could not be become.
+int run(int argc, char **argv) {
   CLI::App app("Join a pool and become a command.", "poolctl-exec");
   std::string pool;
   app.formatter(std::make_shared<UsageLine>());
@@ -70,4 +70,16 @@ int main(int argc, char **argv) {
   const int error = errno;
   return complain(std::string(command[0]) + ": " + strerror(error),
                   error == ENOENT ? kNoCommand : kNotExecutable);
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+  try {
+    return run(argc, argv);
+  } catch (...) {
+    // Whatever goes wrong with the very frame: there may be no memory to say more.
+    (void)std::fputs("poolctl-exec: out of memory\n", stderr);
+    return kOwnFailure;
+  }
 }

@@ -44,18 +44,14 @@ ExitStatus act(CLI::App &app, int argc, char **argv, const Action &action) {
 
 }  // namespace
 
-int runTool(CLI::App &app, int argc, char **argv, const Action &action) {
-  const ExitStatus status = act(app, argc, argv, action);
-  if (std::cout.flush()) return status;
-  return complain(app, kExitFailure, "standard output: cannot be written");
-}
-
 int runTool(const Tool &tool, int argc, char **argv) noexcept {
   try {
     CLI::App app(tool.description, tool.name);
     Action action;
-    tool.addCommands(app, &action);
-    return runTool(app, argc, argv, action);
+    tool.addWords(app, &action);
+    const ExitStatus status = act(app, argc, argv, action);
+    if (std::cout.flush()) return status;
+    return complain(app, kExitFailure, "standard output: cannot be written");
   } catch (...) {
     // Whatever goes wrong with the very frame: there may be no memory to say more.
     (void)std::fprintf(stderr, "%s: out of memory\n", tool.name);

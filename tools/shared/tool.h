@@ -23,22 +23,19 @@ class Failure : public std::runtime_error {
   const ExitStatus status;
 };
 
-// What a command line asks for. A sub-command's callback sets it; it runs when the whole line has
-// been found right.
+// What a command line asks for, set beforehand or by a sub-command's callback; it runs when the
+// whole line has been found right.
 using Action = std::function<ExitStatus()>;
 
 struct Tool {
   const char *name;
   const char *description;
-  void (*addCommands)(CLI::App &app, Action *action);  // the action lives as long as the app
+  void (*addWords)(CLI::App &app, Action *action);  // the action lives as long as the app
 };
 
-// Parses the line, runs the action that the parsing has set and answers the exit status; a line
-// that sets none is a usage error. Help goes to standard output; output that cannot be written is a
+// Parses the line, runs the action and answers the exit status; a line that sets none is a usage
+// error. Help goes to standard output; output that cannot be written is a
 // failure.
 int runTool(const Tool &tool, int argc, char **argv) noexcept;
-
-// The same for a tool without sub-commands, whose words APP fills.
-int runTool(CLI::App &app, int argc, char **argv, const Action &action);
 
 }  // namespace Tools

@@ -13,7 +13,7 @@
 namespace Knob {
 namespace {
 
-constexpr size_t kMostBytes = 64 * 1024;
+constexpr size_t kMostBytes = size_t{64} * 1024;
 
 std::optional<std::string> readProcessFile(int64_t pid, const char *file) {
   if (pid <= 0) return std::nullopt;

@@ -8,7 +8,7 @@
 namespace Knob::Linux {
 namespace {
 
-constexpr uint64_t kMegabyte = 1024 * 1024;
+constexpr uint64_t kMegabyte = uint64_t{1024} * 1024;
 // Linux counts pages in a signed long: no more bytes than 2^63.
 constexpr int64_t kMostMegabytes = (int64_t{1} << 43) - 1;
 constexpr int64_t kPeriodMicroseconds = 100000;

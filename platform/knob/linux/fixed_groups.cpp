@@ -65,7 +65,7 @@ void makeFixedGroups(Groups &groups) {
 }
 
 BuildSignature readSignature(Groups &groups) {
-  const BuildSignature own = buildSignature();
+  BuildSignature own = buildSignature();
   const GroupPtr host = groups.lookUp(kRootName);
   if (!host) return own;
   const auto text = readAttribute(host->directory, kLibraryAttribute);

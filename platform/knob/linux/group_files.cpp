@@ -31,7 +31,7 @@ struct DirectoryCloser {
 }  // namespace
 
 GroupPtr Groups::make(Group &parent, std::string_view name) {
-  const GroupPtr group = makeIn(parent.directory, name);
+  GroupPtr group = makeIn(parent.directory, name);
   group->parent = parent.id;
   return group;
 }
@@ -59,7 +59,7 @@ GroupPtr Groups::makeIn(int parentDirectory, std::string_view name) {
     (void)::unlinkat(parentDirectory, text.c_str(), AT_REMOVEDIR);  // the first error counts
     fail(error, "cannot open " + text);
   }
-  const GroupPtr group = adopt(std::move(directory), identity.id);
+  GroupPtr group = adopt(std::move(directory), identity.id);
   group->name = text;
   group->unrecordedMax = -1;
   return group;

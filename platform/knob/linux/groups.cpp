@@ -57,7 +57,7 @@ GroupPtr Groups::lookUp(std::string_view path) {
     if (paths_.size() >= kMostPathsKnown) paths_.clear();
     paths_[text] = identity.id;
   }
-  const GroupPtr group = adopt(std::move(directory), identity.id);
+  GroupPtr group = adopt(std::move(directory), identity.id);
   group->name = path.substr(path.rfind('/') + 1);
   return group;
 }
@@ -152,7 +152,7 @@ GroupPtr Groups::adopt(UniqueFd directory, GroupId id) {
 // An id is known to the whole machine; only what is below host is ours.
 GroupPtr Groups::findUpwards(UniqueFd directory, GroupId id) {
   if (!host()) noSuchGroup();
-  const GroupPtr group = adopt(std::move(directory), id);
+  GroupPtr group = adopt(std::move(directory), id);
   try {
     for (GroupPtr at = group; at->id != hostId_; at = parentOf(*at)) {
     }
@@ -176,7 +176,7 @@ GroupPtr Groups::findByWalking(GroupId id) {
     for (Child &child : children(group)) {
       const std::string path = folder + "/" + child.name;
       if (child.id == id) {
-        const GroupPtr found = lookUp(path);
+        GroupPtr found = lookUp(path);
         if (found && found->id == id) return found;
         noSuchGroup();
       }

@@ -21,7 +21,7 @@ namespace {
 using Platform::UniqueFd;
 
 constexpr const char *kMountInfoFile = "/proc/self/mountinfo";
-constexpr size_t kMostMountInfoBytes = 16 * 1024 * 1024;
+constexpr size_t kMostMountInfoBytes = size_t{16} * 1024 * 1024;
 constexpr const char *kUnifiedBoot =
     "boot with systemd.unified_cgroup_hierarchy=1, or with cgroup_no_v1=all";
 

@@ -209,9 +209,9 @@ void KernelOnGroups::recordTheUnrecorded() noexcept {
 
 // Every id that a caller can have came from a look-up below it, so it is there.
 GroupPtr KernelOnGroups::host() {
-  if (const GroupPtr group = groups_.openHost()) return group;
+  if (GroupPtr group = groups_.openHost()) return group;
   makeFixedGroups(groups_);
-  if (const GroupPtr group = groups_.host()) return group;
+  if (GroupPtr group = groups_.host()) return group;
   noSuchGroup();
 }
 
