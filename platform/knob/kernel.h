@@ -95,7 +95,7 @@ class Kernel {
 
   // Makes a group with the default allocations. Bad parameter (name), not found (parent), exists,
   // busy (living members in the parent), out of memory (the parent, or a group above it, may have
-  // none).
+  // none, as far as this process has seen).
   virtual GroupId create(GroupId parent, std::string_view name) = 0;
 
   // Not found; busy (child groups or living members); permission denied (the two fixed groups).

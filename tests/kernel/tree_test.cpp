@@ -107,6 +107,15 @@ TEST_F(Tree, ChildGroupsAreCounted) {
   EXPECT_EQ(countChildGroups(idOf("host/opt/pool7")).value, 1);
 }
 
+TEST_F(Ids, OfADeletedGroupAreNotFoundWhateverIsSet) {
+  const int64_t id = newGroup("host/opt", "pool");
+  ASSERT_EQ(remove(id), kSuccess);
+  for (const char *setting : {"shares=1000", "shares=-9", "min=5", "max=0", "min=-2"}) {
+    EXPECT_EQ(setMemory(id, {setting}), kNotFound) << setting;
+    EXPECT_EQ(setCpu(id, {setting}), kNotFound) << setting;
+  }
+}
+
 TEST_F(Ids, EveryCallAboutAGroupThatIsGoneAnswersNotFound) {
   const int64_t id = newGroup("host/opt", "pool");
   ASSERT_EQ(remove(id), kSuccess);

@@ -3,13 +3,14 @@
 #include "knob/linux/bookkeeper.h"
 
 #include <algorithm>
-#include <array>
+#include <chrono>
 #include <limits>
+#include <thread>
 
 #include "knob/allocation.h"
-#include "knob/linux/file_values.h"
+#include "knob/linux/control_values.h"
 #include "knob/linux/memory_lowering.h"
-#include "knob/linux/writes.h"
+#include "knob/linux/tree_lock.h"
 #include "knob/peaks.h"
 
 namespace Knob::Linux {
@@ -30,6 +31,9 @@ Record newRecord(const Group &group) {
   return record;
 }
 
+// Of the few files of a group.
+constexpr std::chrono::milliseconds kLongestWriting{5};
+
 bool isLower(int64_t max, int64_t than) {
   return max != -1 && (than == -1 || max < than);
 }
@@ -40,8 +44,9 @@ bool areEqual(const Allocation &a, const Allocation &b) {
 
 // Whether a new group with this memory allocation needs no record yet: its file says all of it.
 bool isMaximumAlone(const Allocation &memory) {
-  const Allocation none;
-  return memory.min == none.min && memory.minLimit == none.minLimit && memory.shares == none.shares;
+  Allocation alone;
+  alone.max = maximumMegabytes(parseLimit(memoryText(memory.max)).value_or(0));
+  return areEqual(memory, alone);
 }
 
 [[noreturn]] void refuse(const std::string &where) {
@@ -91,49 +96,76 @@ Held Bookkeeper::readToChange(Group &group) const {
 }
 
 void Bookkeeper::change(Group &group, Resource resource, const AllocationChange &change) {
-  try {
-    changeHeld(group, readToChange(group), resource, change);
-  } catch (const KernelError &error) {
-    // Its maker has given it a record just now.
-    if (error.status != Status::kExists) throw;
-    changeHeld(group, readToChange(group), resource, change);
+  for (;;) {
+    try {
+      return changeHeld(group, readToChange(group), resource, change);
+    } catch (const KernelError &error) {
+      // Its maker, or that of a group above, has made its record just now; each makes one.
+      if (error.status != Status::kExists) throw;
+    }
   }
 }
 
 bool Bookkeeper::changeNew(Group &group, const AllocationChange &change) {
-  if (!group.unrecordedMax) return false;
   const Record before = newRecord(group);
   Record after = before;
   after.cpu.allocation = changedAllocation(before.cpu.allocation, change);
   if (after.cpu.allocation.min != 0 || areEqual(after.cpu.allocation, before.cpu.allocation)) {
     return false;
   }
-  Writes writes(groups_);
   try {
-    writeControls(writes, group, valuesOf(Resource::kCpu, before.cpu, facts_.cpus),
-                  valuesOf(Resource::kCpu, after.cpu, facts_.cpus));
-    writes.record(group, nullptr, after);
+    writeRecord(group, after, Attribute::kNew);
   } catch (const KernelError &) {
     return false;
   }
-  writes.commit();
+  try {
+    Writes writes(groups_);
+    writeControls(writes, group, valuesOf(Resource::kCpu, before.cpu, facts_.cpus),
+                  valuesOf(Resource::kCpu, after.cpu, facts_.cpus));
+    writes.commit();
+  } catch (const KernelError &) {
+    takeBackCpu(group, after);
+    throw;
+  }
+  const RecordBytes bytes = encode(after);
+  if (readAttribute(group.directory, kRecordAttribute) !=
+      std::string_view(bytes.data(), bytes.size())) {
+    restoreCpu(group);
+  }
   return true;
 }
 
-void Bookkeeper::recordNew(Group &group) noexcept {
-  if (!group.unrecordedMax || group.unrecordedMax == -1) return;
-  try {
-    writeRecord(group, newRecord(group), Attribute::kNew);
-  } catch (const std::exception &) {
-    // Somebody else has made it, or the group is gone.
-  }
-}
-
-void Bookkeeper::restoreCpuFiles(Group &group) {
+// Another process has changed the record while the files were written. What it says counts.
+void Bookkeeper::restoreCpu(Group &group) {
+  const GroupPtr top = groups_.openHost();
+  const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
   const Held held = read(group);
   if (!held.isStored) return;
   for (const Value &value : valuesOf(Resource::kCpu, held.record.cpu, facts_.cpus)) {
     groups_.write(group, value.control, value.text);
+  }
+}
+
+// The files could not be written; most often the group is gone.
+void Bookkeeper::takeBackCpu(Group &group, const Record &made) noexcept {
+  try {
+    const GroupPtr top = groups_.openHost();
+    const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
+    Held held = read(group);
+    if (!held.isStored || !areEqual(held.record.cpu.allocation, made.cpu.allocation)) return;
+    held.record.cpu.allocation = {};
+    writeRecord(group, held.record);
+  } catch (const std::exception &) {
+    // That leaves what a crash would leave, and check() finds it.
+  }
+}
+
+void Bookkeeper::recordNew(Group &group) noexcept {
+  if (group.unrecordedMax.value_or(-1) == -1) return;
+  try {
+    writeRecord(group, newRecord(group), Attribute::kNew);
+  } catch (const std::exception &) {
+    // Somebody else has made it, or the group is gone.
   }
 }
 
@@ -193,6 +225,14 @@ void Bookkeeper::releaseChild(Group &parent, const Held &child) {
 }
 
 std::vector<Deviation> Bookkeeper::deviations(Group &group, const Record &record) const {
+  std::vector<Deviation> found = compare(group, record);
+  if (found.empty()) return found;
+  // Its maker may be about to write them.
+  std::this_thread::sleep_for(kLongestWriting);
+  return compare(group, record);
+}
+
+std::vector<Deviation> Bookkeeper::compare(Group &group, const Record &record) const {
   std::vector<Deviation> found;
   for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
     for (const Value &value : valuesOf(resource, record.books(resource), facts_.cpus)) {

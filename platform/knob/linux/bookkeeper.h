@@ -1,5 +1,6 @@
 // What groups have been given: reading it from their records or files, changing it, and keeping the
-// sums and the protection of everything above in step. The caller holds the lock on the tree.
+// sums and the protection of everything above in step. The caller holds the lock on the tree, but
+// for reading, and where it is said that none is needed.
 #pragma once
 
 #include <optional>
@@ -45,17 +46,14 @@ class Bookkeeper {
   // refused, memory busy.
   void change(Group &group, Resource resource, const AllocationChange &change);
 
-  // The first CPU settings of a group that this process made, without the lock: the files first,
-  // then the record, which cannot be made when there is one. False: this is not such a group or
-  // such a change, or somebody else or an error was in the way; the caller takes the lock, restores
-  // the CPU files and calls change(). Throws KernelError: bad parameter.
+  // The first CPU settings of a new group, without the lock: the record first, which cannot be made
+  // when there is one, then the files, then a look at whether the record is still that one. False,
+  // and nothing is changed: somebody else has made the record, or it is not such a change; change()
+  // is to be called. Throws KernelError: bad parameter, not found.
   bool changeNew(Group &group, const AllocationChange &change);
 
-  // Makes the record of a new group that has been given something.
+  // Makes the record of a new group that has been given something. Needs no lock.
   void recordNew(Group &group) noexcept;
-
-  // Writes what the record says, where there is one. Throws KernelError.
-  void restoreCpuFiles(Group &group);
 
   // Takes a deleted child's reservations out of its parent and all above. child: as it was.
   void releaseChild(Group &parent, const Held &child);
@@ -66,6 +64,9 @@ class Bookkeeper {
  private:
   struct Place;
   Held readToChange(Group &group) const;
+  void restoreCpu(Group &group);
+  void takeBackCpu(Group &group, const Record &made) noexcept;
+  std::vector<Deviation> compare(Group &group, const Record &record) const;
   void changeHeld(Group &group, Held held, Resource resource, const AllocationChange &change);
   // A group that somebody else gave a minimum, and that now gets a record, is one more reservation:
   // whether it was, and is counted now.

@@ -20,7 +20,7 @@ namespace {
 
 using Platform::UniqueFd;
 
-// With five descriptors for each group at most, far from every process's limit. Room is made in
+// With six descriptors for each group at most, far from every process's limit. Room is made in
 // bulk, since closing in bulk is cheap.
 constexpr size_t kMostGroupsOpen = 48, kGroupsKept = 8;
 constexpr size_t kMostPathsKnown = 64;

@@ -1,9 +1,7 @@
-// Reading one group needs no lock: a record is one attribute, and Linux answers it whole.
+// Reading one group needs no lock: a record is one attribute, and Linux answers it whole. Of a
+// group without one the files are read, one after the other.
 #include "knob/linux/kernel_on_groups.h"
 
-#include <cerrno>
-#include <limits>
-#include <optional>
 #include <utility>
 
 #include "knob/linux/check.h"
@@ -73,10 +71,19 @@ GroupId KernelOnGroups::makeIn(const GroupPtr &parent, std::string_view name) {
   } catch (const KernelError &error) {
     // Removed by somebody at once; that does not undo that it was made.
     if (error.status == Status::kNotFound) return group->id;
-    groups_.remove(*group, *parent);
+    removeAgain(*group, *parent);
     throw;
   }
   return group->id;
+}
+
+// The first error counts.
+void KernelOnGroups::removeAgain(Group &group, Group &parent) noexcept {
+  try {
+    groups_.remove(group, parent);
+  } catch (const std::exception &) {
+    // Somebody else has removed it or uses it already.
+  }
 }
 
 void KernelOnGroups::remove(GroupId id) {
@@ -101,13 +108,24 @@ Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
 }
 
 void KernelOnGroups::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
-  const GroupPtr top = host();  // outlives the lock on its directory
   const GroupPtr group = groups_.find(id);
+  // What was set under the lock just now has its controllers, and most likely no record yet.
+  const bool isNew = group == unrecorded_ && group->unrecordedMax;
   if (group != unrecorded_) recordTheUnrecorded();
-  const bool isNew = resource == Resource::kCpu && group->unrecordedMax;
-  if (isNew && books_.changeNew(*group, change)) return;
+  try {
+    if (isNew && resource == Resource::kCpu && books_.changeNew(*group, change)) return;
+    changeAlone(group, resource, change);
+  } catch (const KernelError &error) {
+    // Whatever is asked of a group that is gone, it is not found.
+    if (error.status == Status::kBadParameter) groups_.requireAlive(*group);
+    throw;
+  }
+}
+
+void KernelOnGroups::changeAlone(const GroupPtr &group, Resource resource,
+                                 const AllocationChange &change) {
+  const GroupPtr top = host();  // outlives the lock on its directory
   const TreeLock lock(top->directory, TreeLock::Kind::kExclusive);
-  if (isNew) books_.restoreCpuFiles(*group);
   group->hasMemory = false;
   books_.change(*group, resource, change);
   if (group->unrecordedMax) unrecorded_ = group;
@@ -140,8 +158,9 @@ void KernelOnGroups::join(GroupId id, int64_t pid) {
 void KernelOnGroups::requireAnyMemory(GroupPtr group, Seen seen) {
   for (; group; group = groups_.parentOf(*group)) {
     if (group->hasMemory && seen == Seen::kCounts) continue;
-    group->hasMemory = readControlIfAny(group->directory, rowOf(Control::kMemoryMax).name) != "0";
-    if (!group->hasMemory) {
+    const auto max = readControlIfAny(group->directory, rowOf(Control::kMemoryMax).name);
+    group->hasMemory = max && max != "0";
+    if (max == "0") {
       throw KernelError(Status::kOutOfMemory, "the group, or one above it, may have no memory");
     }
   }

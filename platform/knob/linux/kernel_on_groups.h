@@ -1,5 +1,5 @@
 // Each operation of the kernel interface on cgroup directories, under the lock on the tree where it
-// changes or compares more than one thing.
+// changes or compares more than one thing; but for the first CPU settings of a new group.
 #pragma once
 
 #include <string_view>
@@ -38,6 +38,8 @@ class KernelOnGroups : public Kernel {
   GroupPtr find(GroupId id);
   GroupId makeIn(const GroupPtr &parent, std::string_view name);
   void recordTheUnrecorded() noexcept;
+  void changeAlone(const GroupPtr &group, Resource resource, const AllocationChange &change);
+  void removeAgain(Group &group, Group &parent) noexcept;
   // Whether what this process saw of a maximum before is enough, or others may have changed it.
   enum class Seen { kCounts, kMayHaveChanged };
   void requireAnyMemory(GroupPtr group, Seen seen);
@@ -45,7 +47,7 @@ class KernelOnGroups : public Kernel {
   Groups groups_;
   const HostFacts facts_;
   Bookkeeper books_;
-  GroupPtr unrecorded_;  // the last call gave this new group a maximum; its record is still to come
+  GroupPtr unrecorded_;  // a new group whose memory was set last, and whose record is still to come
 };
 
 }  // namespace Knob::Linux

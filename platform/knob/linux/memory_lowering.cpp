@@ -39,7 +39,7 @@ class LoweredHigh {
     // An unrecorded minimum is counted nowhere, and must not look as if it were.
     if (!held.isStored) noted.memory.allocation.min = 0;
     noted.savedHigh = saved_;
-    writeRecord(group_, noted);
+    writeRecord(group_, noted, held.isStored ? Attribute::kAny : Attribute::kNew);
     isLowered_ = true;
     try {
       writeHigh(group_, limit);

@@ -22,9 +22,6 @@ class Writes {
   void record(Group &group, const Record *before, const Record &after);
   void control(Group &group, Control control, const std::string &before, const std::string &after);
 
-  // Remembers how to take back something that was written elsewhere.
-  void remember(std::function<void()> takeBack) { undo_.push_back(std::move(takeBack)); }
-
   // What was written stays.
   void commit() { undo_.clear(); }
 

@@ -20,6 +20,7 @@
 #include <sstream>
 #include <system_error>
 
+#include "interrupted_calls.h"
 #include "knob/linux/linux_kernel.h"
 #include "knob/linux/record.h"
 #include "knob/signature.h"
@@ -133,11 +134,12 @@ class OnLinux : public testing::Test {
     change.shares = shares;
     kernel_->setAllocation(id, Resource::kCpu, change);
   }
-  void setCpuMin(GroupId id, int64_t min) {
+  static void setCpuMinOf(Kernel &kernel, GroupId id, int64_t min) {
     AllocationChange change;
     change.min = min;
-    kernel_->setAllocation(id, Resource::kCpu, change);
+    kernel.setAllocation(id, Resource::kCpu, change);
   }
+  void setCpuMin(GroupId id, int64_t min) { setCpuMinOf(*kernel_, id, min); }
   std::vector<std::string> check(bool repair) {
     std::vector<std::string> lines;
     for (const Finding &finding : kernel_->check(repair)) {
@@ -585,15 +587,124 @@ TEST_F(OnLinux, AMaximumAloneIsRecordedWithTheCpuSettingsThatFollow) {
               testing::ElementsAre("host/opt/pool: memory.max is max, not 104857600"));
 }
 
-TEST_F(OnLinux, AMaximumAloneIsRecordedByTheNextCallOrTheEndOfTheProcess) {
-  for (const bool isEnd : {false, true}) {
-    const GroupId id = create("host/opt", isEnd ? "ended" : "called");
+TEST_F(OnLinux, AMaximumAloneIsRecordedByTheNextCallOfWhateverKind) {
+  const std::vector<std::function<void(GroupId)>> calls = {
+      [&](GroupId) { kernel_->lookUp("host/opt"); },
+      [&](GroupId id) { kernel_->members(id); },
+      [&](GroupId) { setMemory(create("host/opt", "next"), 0, 50); },
+      [&](GroupId) { kernel_ = open(); },
+  };
+  for (size_t i = 0; i < calls.size(); ++i) {
+    const std::string name = "pool" + std::to_string(i);
+    const GroupId id = create("host/opt", name);
     setMemory(id, 0, 100);
-    if (isEnd) kernel_ = open();
-    write(isEnd ? "host/opt/ended" : "host/opt/called", "memory.max", "max");
-    EXPECT_EQ(check(true).size(), 1U);
-    EXPECT_EQ(fileText(isEnd ? "host/opt/ended" : "host/opt/called", "memory.max"), "104857600");
+    calls[i](id);
+    EXPECT_EQ(attribute("host/opt/" + name, kRecordAttribute).size(), kRecordSize) << i;
   }
+}
+
+TEST_F(OnLinux, AMaximumThatNoFileHoldsIsRecordedAtOnce) {
+  const GroupId id = create("host/opt", "pool");
+  const int64_t most = int64_t{1} << 43;
+  setMemory(id, 0, most);
+  EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "max");
+  EXPECT_EQ(open()->readAllocation(id, Resource::kMemory).max, most);
+}
+
+TEST_F(OnLinux, NobodySeesHalfOfTheCpuSettingsOfANewGroup) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  const auto other = open();
+  std::vector<std::pair<int64_t, int64_t>> seen;
+  const auto look = [&] {
+    const Allocation cpu = other->readAllocation(id, Resource::kCpu);
+    seen.emplace_back(cpu.max, cpu.shares);
+  };
+  InterruptedCalls::beforeNextAttribute(look);
+  InterruptedCalls::beforeEveryWrite(look);
+  setCpu(id, 50, 2000);
+  InterruptedCalls::beforeEveryWrite(nullptr);
+  using Pair = std::pair<int64_t, int64_t>;
+  EXPECT_THAT(seen, testing::ElementsAre(Pair(-1, -3), Pair(50, 2000), Pair(50, 2000)));
+}
+
+TEST_F(OnLinux, WhatAnotherProcessSetsWhileTheMakerWritesItsFilesCounts) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  const auto other = open();
+  InterruptedCalls::beforeNextWrite([&] {
+    AllocationChange change;
+    change.min = 20;
+    change.max = 30;
+    other->setAllocation(id, Resource::kCpu, change);
+  });
+  setCpu(id, 50, 2000);
+  EXPECT_EQ(kernel_->readAllocation(id, Resource::kCpu).max, 30);
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.max"), "30000 100000");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AGroupThatIsRemovedWhileItsMakerWritesItsFilesIsNotFound) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  InterruptedCalls::beforeNextWrite([&] { open()->remove(id); });
+  EXPECT_EQ(statusOfCall([&] { setCpu(id, 50, 2000); }), Status::kNotFound);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, WhatAnotherProcessReservedOfTheCpuOfANewGroupHoldsThroughout) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 0, 100);
+  setCpuMinOf(*open(), id, 60);
+  const auto look = [] { EXPECT_EQ(fileText("host/opt/pool", "cpu.weight"), "6000"); };
+  InterruptedCalls::beforeEveryWrite(look);
+  setCpu(id, 70, 2000);
+  InterruptedCalls::beforeEveryWrite(nullptr);
+  look();
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.max"), "70000 100000");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ALowerMaximumLosesNothingOfTheCpuSettingsMadeMeanwhile) {
+  for (const size_t heldMB : {5, 60}) {
+    const std::string name = "pool" + std::to_string(heldMB);
+    const auto other = open();
+    const GroupId id = create("host/opt", name);
+    setMemory(id, 0, 100);
+    const Member member("host/opt/" + name, heldMB);
+    InterruptedCalls::beforeNextAttribute([&] { setCpu(id, 50, 2000); });
+    AllocationChange lower;
+    lower.max = 30;
+    EXPECT_EQ(statusOfCall([&] { other->setAllocation(id, Resource::kMemory, lower); }),
+              heldMB < 30 ? Status::kSuccess : Status::kMemoryBusy);
+    EXPECT_EQ(kernel_->readAllocation(id, Resource::kCpu).shares, 2000);
+    EXPECT_EQ(kernel_->readAllocation(id, Resource::kCpu).max, 50);
+    EXPECT_TRUE(check(false).empty());
+  }
+}
+
+TEST_F(OnLinux, AReservationBelowTwoGroupsThatGetTheirRecordsMeanwhileSucceeds) {
+  const auto second = open(), third = open();
+  const GroupId outer = create("host/opt", "outer");
+  const GroupId inner = second->create(outer, "inner");
+  const GroupId leaf = third->create(inner, "leaf");
+  setMemory(outer, 0, 100);
+  AllocationChange max;
+  max.max = 90;
+  second->setAllocation(inner, Resource::kMemory, max);
+  InterruptedCalls::beforeNextAttribute([&] {
+    setCpu(outer, 50, 2000);
+    InterruptedCalls::beforeNextAttribute([&] {
+      AllocationChange cpu;
+      cpu.max = 40;
+      second->setAllocation(inner, Resource::kCpu, cpu);
+    });
+  });
+  AllocationChange reserved;
+  reserved.min = 5;
+  third->setAllocation(leaf, Resource::kMemory, reserved);
+  EXPECT_EQ(fileText("host/opt", "memory.min"), "5242880");
+  EXPECT_TRUE(check(false).empty());
 }
 
 TEST_F(OnLinux, WhatAnotherProcessSetOfTheMemoryOfANewGroupStaysWhenItsMakerSetsTheCpu) {
@@ -633,16 +744,19 @@ TEST_F(OnLinux, ANewGroupThatSomebodyElseFilledIsBusyForALowerMaximum) {
   EXPECT_THAT(fileText("host/opt/pool", "memory.events"), HasSubstr("oom_kill 0"));
 }
 
-TEST_F(OnLinux, ANewGroupThatSomebodyElseRemovedTakesNoSettings) {
-  for (const bool isCpu : {false, true}) {
-    const GroupId id = create("host/opt", "pool");
-    open()->remove(id);
-    AllocationChange shares;
-    shares.shares = 1000;
-    EXPECT_EQ(statusOfCall([&] {
-                kernel_->setAllocation(id, isCpu ? Resource::kCpu : Resource::kMemory, shares);
-              }),
-              Status::kNotFound);
+TEST_F(OnLinux, AGroupThatSomebodyElseRemovedIsNotFoundWhateverIsSet) {
+  AllocationChange shares, max, bad;
+  shares.shares = 1000;
+  max.max = 50;
+  bad.shares = -9;
+  for (const AllocationChange &change : {shares, max, bad}) {
+    for (const Resource resource : {Resource::kMemory, Resource::kCpu}) {
+      const GroupId id = create("host/opt", "pool");
+      if (resource == Resource::kCpu) setMemory(id, 0, 100);
+      open()->remove(id);
+      EXPECT_EQ(statusOfCall([&] { kernel_->setAllocation(id, resource, change); }),
+                Status::kNotFound);
+    }
   }
 }
 
