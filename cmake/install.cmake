@@ -32,6 +32,8 @@ install(DIRECTORY ${CMAKE_SOURCE_DIR}/examples
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl COMPONENT programs)
 install(FILES ${CMAKE_SOURCE_DIR}/README.md ${CMAKE_SOURCE_DIR}/CHANGELOG.md
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl COMPONENT programs)
+install(FILES ${CMAKE_SOURCE_DIR}/docs/fleet.md
+        DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl/docs COMPONENT programs)
 
 # Only a package writes to /etc, where its manager looks after changes of the owner's.
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/knob.conf
