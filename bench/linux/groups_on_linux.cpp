@@ -30,7 +30,7 @@ struct Size {
   int parserRepetitions;  // of the slow one
 };
 
-constexpr Size kSizes[] = {{100, 15, 3}, {1000, 9, 1}, {5000, 3, 1}};
+constexpr Size kSizes[] = {{100, 15, 3}, {1000, 9, 1}, {5000, 5, 1}};
 constexpr double kBareGoal = 1.5;
 constexpr double kParserGoal = 10;
 constexpr double kGrowthGoal = 1.2;
