@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The front door. Everything that is done here is done by a script or by CMake; see CONTRIBUTING.md.
 # What a target needs of the system is installed first (root) or named (anybody else).
 

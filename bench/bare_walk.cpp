@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The least that any program on yaml-cpp does with a definition file: parse it, and look at the
 // text of every key and value once. What poolctl costs is compared with this.
 #include <yaml-cpp/yaml.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // vfork semantics through posix_spawn, so that the size of the measuring process does not count.
 #include "child_process.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The commands on definition files of four sizes: list against a bare yaml-cpp program, load and
 // unload on the emulated kernel, and the start of the program. The two sides of a comparison take
 // turns within one run, so that a change in the machine's load meets both.

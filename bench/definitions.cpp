@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The same text for the same number of pools, on every machine.
 #include "definitions.h"
 

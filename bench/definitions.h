@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Definition files of any size, such as a program that manages a large host would write.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One expression, read and evaluated from its text each time, by the language of the definitions
 // and by muParser, in turns.
 #include <muParser.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Medians and quartiles: on a busy machine the mean says more about its neighbours.
 #include "sample.h"
 

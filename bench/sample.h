@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Repeated measurements of one thing, and how they are shown.
 #pragma once
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Where things go. Outside the system's own folders a program finds the libraries beside it,
 # wherever the whole is put; a library of the same name in LD_LIBRARY_PATH still comes first.
 set(programs)

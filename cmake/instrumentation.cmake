@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 if(POOLCTL_SANITIZE)
   add_compile_options(-fsanitize=${POOLCTL_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
   add_link_options(-fsanitize=${POOLCTL_SANITIZE})

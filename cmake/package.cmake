@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The Debian package ("make package"): one for everything, configured with the prefix /usr.
 set(CPACK_GENERATOR DEB)
 set(CPACK_SET_DESTDIR ON)

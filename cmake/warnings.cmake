@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 add_compile_options(-Wall -Wextra -Wconversion -Wshadow)
 add_compile_options($<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor>)
 if(POOLCTL_WERROR)

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # The library's own package names its target differently from version to version:
 # 0.8 exports yaml-cpp::yaml-cpp, 0.7 yaml-cpp, and Debian's 0.6 only variables.
 find_package(yaml-cpp REQUIRED)

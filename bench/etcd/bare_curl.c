@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* The other side of the comparison: as many lookups of the same keys over one kept connection as
    libcurl alone makes them, in C, without a look at what comes back but its status.
 

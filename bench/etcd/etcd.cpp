@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The configuration store under load: what a !config value costs on SQLite and on etcd, against
 // etcdctl and against a bare curl loop, and how many answers a cluster gives when 200 hosts come up
 // at once. The sides of a comparison take turns within one run.

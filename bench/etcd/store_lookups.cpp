@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One field of each of that many objects, looked up as poolctl does it: the store, the object and
 // the field anew each time. Fails when one is missing.
 //

@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* What making pools costs at the least: for each a mkdir and a write to each of its four control
    files, and nothing else. The values are those of groups_on_linux.cpp's definitions.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Loading pools on the Linux kernel, against a bare loop of the same writes (bare_groups) and
 // against Debian's cgconfigparser on the same groups and values. System calls and page faults of
 // this machine cost many times what they cost elsewhere, so only the ratios mean anything. The

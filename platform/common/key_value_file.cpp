@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads the `key = value` form. What a key means is its reader's business.
 #include "common/key_value_file.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one form of configuration file: `key = value` lines and `#` comments. Whatever is not plainly
 // right is an error with file and line; nothing falls back to a default in silence.
 #pragma once

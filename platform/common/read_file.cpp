@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One open, as many reads as the file needs: files of /proc have no size to ask for.
 #include "common/read_file.h"
 

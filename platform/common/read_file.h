@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads whole small files: configurations and the kernel's text files.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Thin: every call here is one call of SQLite and the check of its answer.
 #include "common/sqlite.h"
 

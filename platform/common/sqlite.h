@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SQLite with owners: a Database, its Statements, one Run of a statement, and a Transaction that is
 // rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Finds SQLite's shared library by the name under which every program links it.
 #include "common/sqlite_library.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SQLite's functions, loaded when the first database is opened. Most runs of a program open none,
 // and mapping the library would be a good part of their start.
 #pragma once

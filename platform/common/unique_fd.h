@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Owns one file descriptor.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One store behind libkestrelconfig and kestrelctl: the small interface that the SQLite store
 // implements and that a loadable module implements for another engine. Header alone, so that a
 // module needs nothing of this library but its headers.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Keys, defaults and checks of the configuration file. The form of the file is KeyValueFile's.
 #include "kestrel/configuration.h"
 

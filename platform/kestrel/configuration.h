@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // /etc/kestrel.conf, or the file that KESTREL_CONF names: which store this host uses, and where.
 // The file is read strictly; whatever it gets wrong is a ConfigStoreException with file and line.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one place where an error of the store gets its words: which thing, what was tried, why not.
 #pragma once
 

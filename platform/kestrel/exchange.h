@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The exchange format of whole stores: YAML, a sequence of objects. What a plain scalar is follows
 // its form as on kestrelctl's command line, and a quoted one is a text, so that types survive.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads the exchange format. Everything that is not understood is an error with its place; nothing
 // is skipped.
 #include <yaml-cpp/yaml.h>

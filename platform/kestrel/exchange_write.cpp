@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes the exchange format by hand: the bytes must not depend on the version of a library, and
 // every code point must survive, also those that emitters replace.
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What libkestrelconfig exports: the public classes on top of the store that the configuration
 // names. A process keeps the store that it opened for as long as the configuration stays the same.
 #include <unistd.h>

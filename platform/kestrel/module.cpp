@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A module is never unloaded: the code of its backends and of exceptions under way stands in it.
 #include "kestrel/module.h"
 

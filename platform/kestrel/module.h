@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Loadable modules: a store engine that costs a host nothing unless its configuration names it.
 #pragma once
 

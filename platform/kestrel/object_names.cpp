@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Checks of names, made before a store is touched.
 #include "kestrel/object_names.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What may name an object and its fields, the same for every engine, and how an object is called
 // in messages.
 #pragma once

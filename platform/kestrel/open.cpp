@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which engine stands behind a configuration, and what can be said of it without using it.
 #include "kestrel/open.h"
 

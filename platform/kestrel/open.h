@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The way from a configuration to the store that it names.
 #pragma once
 

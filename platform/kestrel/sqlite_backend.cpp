@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One transaction an operation. A reader keeps its file open and its one lookup prepared; a writer
 // opens the file for the one change.
 #include "kestrel/sqlite_backend.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The store in one SQLite file. The tables are the schema's, the opening of the file is
 // sqlite_file's; here stands what is read and written.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Nothing here may open the store's file except through SQLite: closing any other descriptor of it
 // would give up the locks that a connection of this process holds.
 #include "kestrel/sqlite_file.h"

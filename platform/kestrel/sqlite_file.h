@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The SQLite store as a file: is it there, may it be read, how is it opened, how is it made. What
 // stands in it is the backend's business.
 #pragma once

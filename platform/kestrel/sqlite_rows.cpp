@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One statement an operation where one is enough. A field's value keeps its own SQLite type.
 #include "kestrel/sqlite_rows.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is read and written in the tables, on an open database. Transactions and files are the
 // backend's business; failures are SqliteErrors.
 #pragma once

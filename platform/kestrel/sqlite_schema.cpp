@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Two tables: objects by their four-part id, and the typed fields of each.
 #include "kestrel/sqlite_schema.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The tables of the SQLite store and their version. Everything that a person may do to the file
 // with the sqlite3 shell is checked by the tables themselves.
 #pragma once

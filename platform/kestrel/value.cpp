@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reading and printing of values. Nothing here depends on the locale.
 #include "kestrel/value.h"
 

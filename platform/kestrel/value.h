@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The values that a field can hold, and their written forms: how a text on a command line or in an
 // exchange file becomes a value, and how a value is printed so that reading gives it back exactly.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The C functions of the interface. Nothing else in the library is visible from outside, and no
 // exception passes here.
 #include <cstdio>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sums saturate: a number beyond them is beyond every machine too, and is refused as such.
 #include "knob/admission.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whether a reservation fits: within the group's own limits, those of every group above it, and the
 // machine. Plain functions on values; a kernel reads the values before and stores them after.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Everything here looks at one allocation alone. Whether the rest of the tree has room for it is
 // the business of admission.
 #include "knob/allocation.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reading and checking what a call wants to change of an allocation.
 #pragma once
 

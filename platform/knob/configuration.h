@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // libknob's own configuration: which kernel answers, and where it lives.
 #pragma once
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Writes OUTPUT with the md5 of the interface header HEADER.
 file(MD5 "${HEADER}" sum)
 file(WRITE "${OUTPUT}"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One kernel behind libknob. The node table turns every KNOB call into one call of this interface;
 // what all kernels must refuse alike (names, allocations, admission, peaks) stands in plain
 // functions beside it, and a kernel calls those.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Opens, closes, and keeps the handle from crossing a fork: a kernel's file locks belong to the
 // process that took them, while its memory of them would be inherited.
 #include "knob/live_kernel.h"

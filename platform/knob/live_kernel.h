@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one kernel handle of a process, opened at the first call that needs it and shared by its
 // threads, one call at a time.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Asks the processor and the running Linux. A command line that cannot be read (no /proc) is empty:
 // the other facts do not need it.
 #include "knob/machine_facts.h"

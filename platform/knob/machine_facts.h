@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What this machine says about itself.
 #pragma once
 

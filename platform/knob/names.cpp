@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Names and paths as plain bytes; whether a group of that name exists is the kernel's knowledge.
 #include "knob/names.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What may name a group. The same on every kernel, and strict enough for the strictest.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The numbers of the nodes. They are this library's own: programs pass on what the exported objects
 // hold.
 #pragma once

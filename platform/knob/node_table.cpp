@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The table of nodes, and the checks that every row gets alike.
 #include "knob/node_table.h"
 

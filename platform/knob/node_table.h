@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Turns one call of the interface into one call of the kernel in use. A node is a row of the table;
 // nothing here knows which kernel it is, and nothing here does I/O of its own.
 #pragma once

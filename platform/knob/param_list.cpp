@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every way in which a list can be wrong is found here, before a kernel sees anything of the call.
 #include "knob/param_list.h"
 

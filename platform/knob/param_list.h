@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parameter lists of the interface, and the checks that a call makes of the ones it is given.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The highest values of a group's life, kept in KB although memory is reserved in MB.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The records that cross the interface, byte for byte. Every byte that has no name here is written
 // as 0.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Chooses the kernel. There is no falling back from one to the other: a reservation that is not
 // real must never look like one.
 #include "knob/session.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The way from the configuration to the kernel that it names. libknob's calls and knobctl both come
 // through here.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one file that holds the build's date; SOURCE_DATE_EPOCH fixes it for builds that must be
 // alike.
 #include "knob/signature.h"

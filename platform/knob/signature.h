@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What this build of libknob is known by.
 #pragma once
 

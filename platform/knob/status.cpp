@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Looks texts up; the texts themselves stand in the header's table.
 #include "knob/status.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The statuses of libknob and their texts for people, in one table.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads and computes an expression in one pass, by functions that mirror the grammar:
 //
 //   expression := operand tail

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The expression language of pool definitions: one text, a table of variables, one number.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Evaluates "!calc" nodes and gives the faults of their expressions a place in the file.
 #include "calc/node_evaluator.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The value of a node tagged "!calc": one expression, or a mapping of local definitions that ends
 // with the expression.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Chooses by a value's tag who converts it, and bounds how far one value may lead into others.
 #include "calc/tagged_value.h"
 

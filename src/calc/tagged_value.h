@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one door from a pool's value to a number or a truth value: plain, "!calc" or "!config".
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The variables that an expression may name.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Levels out the differences between releases of the yaml library.
 #include "calc/yaml_node.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How values are taken out of YAML nodes. The yaml library's releases differ in what they call a
 // null and in some of their texts; here every release gives the same answer.
 #pragma once

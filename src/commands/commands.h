@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The sub-commands and the older option mode. Each parses its own options with getopt and returns
 // the exit status of the process; exceptions are left to the entry point.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Zeroes the memory of named groups and deletes them, waiting for busy ones on request.
 #include <unistd.h>
 

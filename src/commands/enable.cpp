@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Restores disabled pools from their definitions in the definition folder.
 #include <unistd.h>
 

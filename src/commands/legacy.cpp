@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The older option mode, kept for scripts that size and watch one memory group at a time.
 #include <syslog.h>
 #include <unistd.h>

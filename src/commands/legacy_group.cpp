@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Talks to KNOB for the option mode.
 #include "commands/legacy_group.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel calls of the option mode, which answers with statuses where the sub-commands throw.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Prints the declared pools as a table or as comma-separated values; reads definitions alone.
 #include <unistd.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Creates the enabled pools as kernel groups; a batch that fails is undone.
 #include <unistd.h>
 

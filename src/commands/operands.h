@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What getopt has left of a command line.
 #pragma once
 

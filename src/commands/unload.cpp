@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Deletes the declared pools' kernel groups, children first; a batch that fails is undone.
 #include <unistd.h>
 

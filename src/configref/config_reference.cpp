@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads a "!config" mapping and looks its field up in the configuration store.
 #include "configref/config_reference.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Values tagged "!config": a field of an object in the host's configuration store, or a default.
 #pragma once
 

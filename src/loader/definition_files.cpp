@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Finds the definition files, insists on their installed mark, and gathers their pools.
 #include "loader/definition_files.h"
 

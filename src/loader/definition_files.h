@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The definition files: which there are, which are installed, and the pools that they declare.
 #pragma once
 

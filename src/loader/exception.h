@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The error of a definition that knows its place in the file. Whatever reads definitions throws
 // it; the mark and the bare message stay readable (`mark`, `msg`).
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Makes every message that names a definition file.
 #include "loader/file_error.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // An error that names a definition file.
 #pragma once
 

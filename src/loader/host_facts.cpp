@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads four kernel records, each once in the process, and makes the variables of them.
 #include "loader/host_facts.h"
 

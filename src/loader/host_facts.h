@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The facts of the host that expressions may use.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Fills a pool record from a YAML mapping: defaults, keys in the order of the document, the name.
 #include "loader/resource_pool.h"
 

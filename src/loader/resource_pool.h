@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One pool as a definition declares it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The process entry: checks that the kernel is the one this tool was built for, chooses the
 // sub-command or the option mode, and is the one place that reports an escaping error.
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The client of the host configuration store. An object is named by an id and holds named fields;
 // a field is an integer, a real number, a truth value or a text.
 //

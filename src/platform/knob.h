@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* The kernel's system-information node interface (KNOB): named nodes that are read and set, and
    the kernel's text for a status.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's records of what a scheduler group may have, in the layout of its allocation nodes.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Makes every message of a failed scheduler-group operation.
 #include "sched/exception.h"
 

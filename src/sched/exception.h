@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The failure of one scheduler-group operation, and the kernel statuses that callers tell apart.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Turns typed operations on scheduler groups into exchanges over KNOB.
 #include "sched/scheduler_group.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's scheduler groups. Each operation is one exchange with the kernel and throws
 // Sched::Exception, whose message begins with the interface call that failed.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whole stories on the emulated kernel. A case is a folder of "cases":
 //   command         a shell script; the programs of the build stand in its search path
 //   rp.d/           installed in /etc/rp.d before it runs

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the tests of the program as a process share: a world with the stand-ins, a private /etc,
 // and claims about one run.
 #pragma once

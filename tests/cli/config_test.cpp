@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // "!config" values through the whole program, with a configuration store that follows a script.
 #include "cli_fixture.h"
 

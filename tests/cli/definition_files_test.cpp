@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which definition files are read, and the message of each way in which one can be bad. Seen
 // through the list command in CSV form.
 #include "cli_fixture.h"

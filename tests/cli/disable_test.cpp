@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The disable command: the three calls for each name, the wait for busy groups, and its reports.
 #include "cli_fixture.h"
 #include "usage_texts.h"

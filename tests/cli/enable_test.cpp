@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The enable command: which groups it makes, which it restores, and which it leaves alone.
 #include "cli_fixture.h"
 #include "usage_texts.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The entry point: the check of the kernel, the choice of a command, the help, and the one report
 // of an error that a command lets escape.
 #include "cli_fixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel interface fails at the first call, then at the second, and so on until a command gets
 // through; once, and from that call on. After each run the groups, the messages and the status
 // must be right, and no parameter list may be lost.

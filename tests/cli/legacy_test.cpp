@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The older option mode: its options, its exit statuses, and the kernel calls of each request.
 #include "cli_fixture.h"
 #include "usage_texts.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The list command: its two forms, byte for byte.
 #include "cli_fixture.h"
 #include "usage_texts.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The load command: what it creates, what it leaves, and how it undoes.
 #include "cli_fixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Other programs put their own libraries in the place of the two platform libraries: the program
 // must load whichever comes first, and use nothing of them but the documented interface.
 #include <set>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The unload command: what it deletes, and how it makes groups again when it cannot go on.
 #include "cli_fixture.h"
 

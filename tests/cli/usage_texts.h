@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The usage texts, written out a second time: scripts and people rely on every byte.
 #pragma once
 

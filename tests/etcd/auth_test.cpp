@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Users and passwords on a real server.
 #include <gmock/gmock.h>
 #include <sys/stat.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // "openssl ca" is the one form of the tool that takes both dates of a certificate.
 #include "certificates.h"
 

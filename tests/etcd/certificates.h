@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Certificates for one test, made with openssl: an authority, servers' and clients' certificates
 // for the test's own address, right ones and expired ones.
 #pragma once

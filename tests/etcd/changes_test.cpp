@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Changes and listings on a real server: what they leave alone, what they refuse whole, and that
 // writers at the same time lose nothing of one another's.
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A cluster of three whose members die, stop and come back under a run.
 #include <gmock/gmock.h>
 

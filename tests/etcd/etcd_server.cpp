@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // etcd is asked whether it is ready, in short steps and with an end; nothing is guessed from time.
 #include "etcd_server.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Real etcd servers for one test: on a loopback address of the test's own, with their data in the
 // test's folder, and gone with the test however it ends.
 #pragma once

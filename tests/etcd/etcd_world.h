@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the tests of the etcd store have in common: names of objects, stores, and what is caught.
 #pragma once
 

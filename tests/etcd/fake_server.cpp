@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // As much of HTTP as libcurl needs, and not more.
 #include "fake_server.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Servers that are no etcd: each test says what they answer, and when.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Members that are slow, that answer garbage, that say one thing and then another: what a run makes
 // of them, and how long it takes.
 #include <gmock/gmock.h>

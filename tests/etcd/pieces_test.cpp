@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parts of the etcd store that need no server: base64, keys, values, the gateway's texts, what
 // refusals mean, and the password's file.
 #include <gmock/gmock.h>

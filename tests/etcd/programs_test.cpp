@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The built programs on a fleet's store: poolctl takes its values from it, kestrelctl writes it,
 // and a host on SQLite knows nothing of it.
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One run sees one revision, whatever others change meanwhile.
 #include <gmock/gmock.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Looks one field up as any program does, through libkestrelconfig alone, and prints what came back
 // or which exception did; after that, what the process has mapped.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TLS on a real server, with certificates that the test makes.
 #include <gmock/gmock.h>
 

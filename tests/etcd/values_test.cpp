@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Objects and their values on a real server: what is written comes back, what was written by hand
 // is read or refused, and every name has a place of its own.
 #include <cmath>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any document as a reference to the configuration store. Its first byte says what the store holds.
 #include <cstdint>
 #include <stdexcept>

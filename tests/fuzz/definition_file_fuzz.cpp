@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any bytes as a definition file: either pools with full names, or an error that names the file.
 #include <sys/mman.h>
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any text as what an etcd member answers, as the value of a key, and as a key. Whatever is wrong
 // with it is one of two exceptions; everything else that is thrown ends the run.
 #include <cstdint>

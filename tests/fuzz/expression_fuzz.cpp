@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any text as an expression. Short ones must mean the same as in the plain second reading.
 #include <cmath>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a set takes: any of four settings, each once, checked whole and applied whole.
 #include "contract_test.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every call is made the way a program makes it: through the lists and records of the interface.
 #include "calls.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // libknob's calls as the cases write them: lists are made and destroyed here, answers are values.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Any number of processes work on one kernel, and any of them may die at any moment.
 #include <sys/wait.h>
 #include <unistd.h>

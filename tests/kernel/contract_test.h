@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The frame of every case of the contract: a kernel started anew, with a group of the case's own.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Puts the emulated kernel under the contract's cases: a state in a temporary folder.
 #include <unistd.h>
 

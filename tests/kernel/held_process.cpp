@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The process says by a byte that it is ready, and then waits for the case to kill it.
 #include "held_process.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A process that lives, and holds what memory it is told to, until the case lets it go.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the contract's cases need of the kernel that they are run against, beside libknob itself. A
 // second kernel is put under the suite with a file like emulated_under_test.cpp.
 #pragma once

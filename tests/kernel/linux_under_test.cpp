@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Puts the Linux kernel under the contract's cases. It runs as root of a machine of its own, whose
 // groups it may do away with. That machine is too small for the cases; what it answers about itself
 // is put in place of the C library's answers, so that both kernels are asked the same.

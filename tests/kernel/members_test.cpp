@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Processes in groups, and the memory that living ones hold.
 #include <unistd.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which names a group can have: a bad one is a bad parameter in a create, and not found in a
 // lookup.
 #include "contract_test.h"

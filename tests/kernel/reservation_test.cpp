@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What makes a reservation worth something: it fits the group, every group above it and the
 // machine, or it is refused and nothing changes.
 #include "contract_test.h"

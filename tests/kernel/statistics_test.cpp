@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The peaks of a group's life, and the facts of the machine.
 #include <array>
 #include <cstring>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The tree, its ids, and the life of a group.
 #include "contract_test.h"
 #include "held_process.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FOLDER.real is the second view of the machine's /etc that the links of FOLDER point into: the
 // first view is covered as soon as FOLDER is mounted.
 #include "private_etc.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Another /etc for one program: everything that the machine has there, but rp.d and the
 // configuration files of the two platform libraries are the test's own. It exists in that
 // program's mount namespace alone; nothing of the machine is changed.

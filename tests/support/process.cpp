@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The program's streams are anonymous files and no pipes: it can never wait for its reader, and a
 // child that it leaves behind can't keep the reader waiting.
 #include "process.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs one program to its end and keeps what it wrote, byte for byte, and how it ended. Where
 // wanted, the program sees another /etc than this machine's (private_etc.h).
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A world in which the program under test meets the stand-in libraries: what they answer, and what
 // they saw. The script lines and the traces are described in recording/README.md.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The harness itself: a test that leans on it must be able to fail.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A folder of the test's own, gone when the test ends; and the marks and texts of files in it.
 #pragma once
 

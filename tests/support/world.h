@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The world of one test: a folder of its own, with definition files, configuration and kernel
 // state, and the programs run in it. Nothing of it is shared with another test.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // More than there is cannot be promised: at the pool, at the groups above it, at the machine.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's own view of the groups: what its control files say, read past libknob. A path is a
 // group's path as pools have it ("host/opt/web"), which is its folder below the mount.
 #pragma once

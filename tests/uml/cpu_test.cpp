@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the CPU settings are worth, by the kernel's own account of the time that each group used.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Processes that are killed in the middle of their work, and many that work at once: the tree that
 // they leave is one that the next can use.
 #include <fcntl.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl-exec on the Linux kernel: the command is in the pool's group, and nothing else is.
 #include <gtest/gtest.h>
 #include <signal.h>

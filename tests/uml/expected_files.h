@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the kernel's control files must say of a pool, worked out from the pool's numbers alone.
 #pragma once
 

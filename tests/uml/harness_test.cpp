@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The machine that the other tests of this folder run in (uml-run), seen from outside.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Names and paths that would lead out of the tree, into a control file or beyond what the kernel
 // takes: each gets a clear status, and nothing outside the tree is touched.
 #include <gtest/gtest.h>

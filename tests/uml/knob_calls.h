@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // libknob called as any program calls it, for what poolctl would never ask. Each answers the
 // status.
 #pragma once

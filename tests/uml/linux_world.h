@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The world of one test inside the machine: the programs of the build on the Linux kernel, and a
 // tree without any group, at the test's begin and at its end.
 #pragma once

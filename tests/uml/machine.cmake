@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Tests that need a Linux kernel of their own: uml-run boots one for the program.
 
 # The sanitizers' shadow memory needs more room than user-mode Linux gives a process. A test that

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // main() of the tests that change the control groups of the kernel that they run on: they run in a
 // user-mode Linux machine of their own (uml-run), and refuse every other.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // No change of settings ever kills a process: what its memory is in the way of is answered "busy".
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl on the Linux kernel: what it was told is what the kernel's own files say.
 #include <gtest/gtest.h>
 #include <unistd.h>

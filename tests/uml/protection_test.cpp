@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a memory minimum is for: a pool keeps it when the machine is short of memory. The files are
 // sparse, so that reading them fills the page cache at once and needs no disk.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs random sequences of operations on one kernel and writes what came of each: the status, and a
 // digest of the whole tree as the kernel gives it back. The operations follow from the numbers of
 // the sequences alone, so that the transcripts of two kernels must be equal, line by line.

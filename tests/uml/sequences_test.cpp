@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The emulated kernel, here, and the Linux kernel, in a machine of its own, answer the same random
 // sequences of operations. Runs on this machine and boots the other one.
 #include <gtest/gtest.h>

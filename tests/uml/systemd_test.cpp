@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Pools beside systemd: a systemd of the machine's own, the units of poolctl-exec(1) with other
 // paths, and the kernel's files as judge of who is where.
 #include <fcntl.h>

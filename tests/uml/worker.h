@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A process that lives in a group and does there what a test wants: nothing, hold memory, read a
 // file, be busy.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Thin: a sub-command reads its words, makes one call of the store and prints the answer. What may
 // be stored and how is the store's business.
 #include "kestrelctl/commands.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kestrelctl's sub-commands: what each takes from the line, and the one call of the store that it
 // makes.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A file is written beside its name and renamed, so that a full disk costs nobody an older export.
 #include "kestrelctl/exchange_files.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Exchange files on disk and on the standard streams. The format is the library's.
 #pragma once
 

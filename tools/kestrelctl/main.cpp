@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kestrelctl: writes and shows the host configuration store.
 #include "kestrelctl/commands.h"
 #include "shared/tool.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Thin: a sub-command reads its words, makes one call of the kernel and prints the answer. What the
 // kernel allows is the kernel's business.
 #include "knobctl/commands.h"

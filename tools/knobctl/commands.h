@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // knobctl's sub-commands: what each takes from the line, and the one call of the kernel that it
 // makes.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Goes as far as it gets, from the configuration over the state to the signature; the first thing
 // that is wrong is the problem.
 #include "knobctl/condition.h"

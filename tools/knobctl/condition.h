@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What `knobctl status` tells: which kernel, where it lives, and whether it can be used.
 #pragma once
 

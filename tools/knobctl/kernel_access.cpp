@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One table from a kernel's status to a tool's exit status.
 #include "knobctl/kernel_access.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel as a tool uses it: its failures are the tool's, with exit status and words for people.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // knobctl: looks at the kernel that libknob is configured for, and works on its groups by hand.
 #include "knobctl/commands.h"
 #include "shared/tool.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The words of `knobctl boot` and the facts that they stand for.
 #include "knobctl/start.h"
 

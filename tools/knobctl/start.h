@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Starting the emulated kernel: the only kernel that a tool can boot.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Collecting and laying out are two functions, so that the second is a pure one.
 #include "knobctl/tree.h"
 

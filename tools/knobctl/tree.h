@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The tree of groups as a table: collected from the kernel, and laid out as text.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl-exec: joins a pool, then becomes the command. Nothing of it stays between the command and
 // whoever started it: the process id, the streams, the signals and the exit status are the
 // command's own.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Puts the calling process into a pool's group.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A file is complete, marked and on the disk before it gets its name; the old one keeps a second
 // name until the change is kept.
 #include "definition_folder.h"

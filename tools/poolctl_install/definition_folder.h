@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The folder of the installed definition files, and changes to its entries. A change becomes
 // visible in one step and can be taken back until it is kept. What is under way carries a name with
 // a leading dot, which no reader of the folder looks at.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes the mark that the loader reads, under the loader's own names and in its order.
 #include "installed_mark.h"
 

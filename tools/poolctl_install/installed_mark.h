@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The mark by which a definition file counts as installed.
 #pragma once
 

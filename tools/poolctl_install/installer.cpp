@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Checks everything first, then changes the entries one by one, and takes the changes back in
 // reverse order when one of them fails.
 #include "installer.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What poolctl-install does, each for several files at once: all of them, or none.
 #pragma once
 

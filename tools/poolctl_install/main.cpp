@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl-install: puts definition files in place, marked as installed, or removes them.
 #include <CLI/App.hpp>
 #include <CLI/Config.hpp>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A tool's sub-commands as one table: the help, the parsing and the dispatch all walk it.
 #pragma once
 

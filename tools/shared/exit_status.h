@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The exit statuses of all tools. Scripts test them, so a number never changes its meaning.
 #pragma once
 

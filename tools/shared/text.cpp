@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Independent of the locale: a tool prints the same bytes everywhere.
 #include "shared/text.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts from outside on a terminal or in a script's hands: nothing in them may end a line, move a
 // cursor or break a table.
 #pragma once

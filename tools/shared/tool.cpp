@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Nothing here knows what a tool does.
 #include "shared/tool.h"
 

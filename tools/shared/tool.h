@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The frame of every tool: reads the command line, runs the chosen action, and is the one place
 // that prints an error: "TOOL: what: why" on standard error.
 #pragma once

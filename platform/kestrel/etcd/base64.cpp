@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Three bytes are four characters; "=" fills the last four.
 #include "kestrel/etcd/base64.h"
 

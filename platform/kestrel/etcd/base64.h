@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Base64, the form in which etcd's HTTP/JSON gateway takes and gives keys and values.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A moment until which something may take. Waiting is always for what is left until then.
 #pragma once
 

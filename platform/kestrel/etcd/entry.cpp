@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one name that the module exports.
 #include <memory>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What each operation asks of the cluster. Lookups are serializable reads of the run's revision;
 // what a change is based on is read from the present state, and the change is made only when that
 // has not changed meanwhile.

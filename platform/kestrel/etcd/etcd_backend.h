@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The store in an etcd cluster: an object is a key, its fields the JSON object that is the key's
 // value.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every option that could let the environment, a server or a signal change what happens is set.
 #include "kestrel/etcd/http_client.h"
 

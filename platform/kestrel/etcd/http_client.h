@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HTTP requests over one kept connection for each server: what is asked of libcurl, and nothing of
 // etcd. The environment is not consulted, redirects are not followed, certificates are verified.
 #pragma once

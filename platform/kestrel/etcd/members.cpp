@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Who is asked, for how long, and what is made of the answers. What the answers hold is the
 // caller's business.
 #include "kestrel/etcd/members.h"

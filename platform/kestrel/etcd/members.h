@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The members of the cluster, asked in turn. What a run has learned of them holds to its end: a
 // member that failed is not asked again, and when none is left nothing is asked any more and
 // nothing waits.

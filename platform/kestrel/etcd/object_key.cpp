@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The coding of ids as keys, and nothing of how they are asked for.
 #include "kestrel/etcd/object_key.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How an object's id becomes an etcd key and back:
 //
 //   PREFIX/NAMESPACE/COMPONENT/GROUP/KEY[/EXTRA]

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reading is event by event and stops at the first thing that no field can hold, so neither depth
 // nor a number's size is ever a matter of the JSON library's own rounding.
 #include "kestrel/etcd/object_value.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How an object's fields become the value of its etcd key and back: one JSON object, a member for
 // each field. 7 is an integer, 7.0 and 7e0 are real numbers, true is a truth value, "7" is a text.
 #pragma once

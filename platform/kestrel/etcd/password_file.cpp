@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is checked is what is read: one descriptor for both.
 #include "kestrel/etcd/password_file.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The password of etcd's user, from a file that nobody but its owner may touch.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Requests are put together by hand, for every part of them is base64 or a number; answers are
 // foreign text and are read with care.
 #include "kestrel/etcd/protocol.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The texts of etcd's HTTP/JSON gateway: requests are made and answers read here, as values and
 // without any I/O. Numbers of 64 bits are texts there, keys and values are base64, and what is zero
 // or empty is left out.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One row for each refusal that has a meaning of its own. gRPC's number comes first; where etcd
 // gives several refusals one number, its text tells them apart, for it sends nothing else.
 #include "kestrel/etcd/refusal.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a refusal of etcd's means for the one who asked.
 #pragma once
 

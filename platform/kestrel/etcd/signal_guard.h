@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Keeps a broken connection from ending the process: the TLS library under libcurl may write to a
 // socket that the other side has closed.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Starts the emulated kernel: the first use does it with this machine's facts, knobctl with others.
 #include <ctime>
 

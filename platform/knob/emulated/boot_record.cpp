@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The file: one value a line in a fixed order, the command line last, as it may hold anything. It
 // names the state that it belongs to by device and inode, so that it outlives no state.
 #include "knob/emulated/boot_record.h"

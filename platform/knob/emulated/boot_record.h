@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A copy of what a boot fixed, in a small file beside the state. Programs that only ask for facts
 // or the signature, as every start of one does, read it and need not open the state at all.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every group is read once, the reservations are summed up anew from the leaves, and what differs
 // from what is kept is a finding.
 #include "knob/emulated/check.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Recounts what the emulated kernel keeps.
 #pragma once
 

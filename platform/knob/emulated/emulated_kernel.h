@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The emulated kernel as the rest of libknob and knobctl see it: a kernel whose groups are rows of
 // one SQLite file. It reserves nothing; it keeps the same books as a kernel that does.
 #pragma once

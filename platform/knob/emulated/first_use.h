@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The boot that needs nobody to ask for it.
 #pragma once
 

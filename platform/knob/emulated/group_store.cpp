@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SQL and the conversions between its integers and ours; nothing else.
 #include "knob/emulated/group_store.h"
 

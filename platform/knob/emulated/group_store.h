@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The rows of the emulated kernel's state: one function for each question and each change, inside a
 // transaction of the caller's. No rule of the kernel stands here.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The operations. Each checks all that it needs, then changes all that it has to.
 #include "knob/emulated/kernel_on_state.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The emulated kernel: the contract's operations on the rows of one state, one transaction each.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads /proc. A process that vanishes meanwhile is simply not there.
 #include "knob/emulated/processes.h"
 

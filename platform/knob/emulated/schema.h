@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The tables of the emulated kernel's state. Whoever changes them raises the version: a library
 // leaves a state of another version alone.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Everything about the state that is a matter of files: places, rights, locks and settings of
 // SQLite.
 #include "knob/emulated/state_file.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The file that holds the emulated kernel's state: where it is, and how it comes to be.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What openat2 does in one call is done part by part where a kernel lacks it or a filter forbids
 // it.
 #include "knob/linux/beneath.h"

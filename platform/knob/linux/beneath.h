@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Opening directories below one directory without ever leaving it: no link, no mount and no ".."
 // leads out. And the ids of groups, which are the file handles of their directories.
 #pragma once

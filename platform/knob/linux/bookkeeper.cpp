@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Growing is written from the top down and shrinking from the bottom up, so that a process killed
 // in between leaves too much reserved, never too little.
 #include "knob/linux/bookkeeper.h"

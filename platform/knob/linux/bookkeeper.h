@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What groups have been given: reading it from their records or files, changing it, and keeping the
 // sums and the protection of everything above in step. The caller holds the lock on the tree, but
 // for reading, and where it is said that none is needed.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The tree is listed from the top, then gone through from the leaves up, so that every sum is made
 // of reservations that are right already.
 #include "knob/linux/check.h"

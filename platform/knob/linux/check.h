@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Recounts what records keep and compares records with files.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The files of a group's directory, and the directory's attributes: reading and writing whole, with
 // errno never lost.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Arithmetic and digits only; no file is touched here.
 #include "knob/linux/control_values.h"
 

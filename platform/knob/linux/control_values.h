@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The values of control files as text: the one place where MB become bytes and percent become
 // microseconds, and back. Linux takes nonsense without a word, so what is written is made here.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Only runs of numbers that are all owned here are closed at once, so no other thread's descriptor
 // can be among them.
 #include "knob/linux/descriptor_set.h"

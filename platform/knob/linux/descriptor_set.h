@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Owns many descriptors and closes them together: neighbouring numbers cost one call, whatever
 // their count, where one close for each would be a third of all the calls that a new group costs.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What each errno means when a cgroup's directory or one of its files answers it.
 #include "knob/linux/errno_status.h"
 

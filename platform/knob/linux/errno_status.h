@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // From what Linux answers to what libknob answers: the one place that knows errno.
 #pragma once
 

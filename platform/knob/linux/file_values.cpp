@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One function for each way. The texts of single values are made and read in control_values.
 #include "knob/linux/file_values.h"
 

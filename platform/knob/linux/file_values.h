@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the files of a group hold for its allocations, and what allocations its files tell.
 #pragma once
 

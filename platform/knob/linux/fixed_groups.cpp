@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A package is upgraded while groups exist: the note keeps the first library's date, and what is
 // compared is the interface alone. So only an upgrade that changes the interface is a mismatch, and
 // only as long as groups of the older one remain.

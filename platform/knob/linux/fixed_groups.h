@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // host and host/opt, which exist from the start: made at first use, together with the note of the
 // library that made them.
 #pragma once

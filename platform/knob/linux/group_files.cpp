@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is done with a group's directory and its files: making and removing, looking into it,
 // passing controllers on, writing settings.
 #include <dirent.h>

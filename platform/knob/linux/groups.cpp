@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // From paths and ids to groups in use, and which of them stay open.
 #include "knob/linux/groups.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The directories of groups: from paths and ids to open descriptors, and back up to host. The
 // descriptors of the groups used last are kept; a descriptor stays with its group for ever, so a
 // group that was deleted answers ENOENT or ENODEV even when another one of its name was made.

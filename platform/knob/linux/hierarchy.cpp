@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every reason stands alone: what is missing, then how to mend it.
 #include "knob/linux/hierarchy.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The place where the tree stands: finding the cgroup2 mount and the folder below it, and telling
 // what a host lacks that cannot be used, with the way to mend it.
 #pragma once

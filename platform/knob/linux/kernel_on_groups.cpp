@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reading one group needs no lock: a record is one attribute, and Linux answers it whole. Of a
 // group without one the files are read, one after the other.
 #include "knob/linux/kernel_on_groups.h"

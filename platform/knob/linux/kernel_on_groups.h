@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each operation of the kernel interface on cgroup directories, under the lock on the tree where it
 // changes or compares more than one thing; but for the first CPU settings of a new group.
 #pragma once

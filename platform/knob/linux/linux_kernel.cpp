@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Opens the Linux kernel of this machine, and looks at it from outside.
 #include "knob/linux/linux_kernel.h"
 

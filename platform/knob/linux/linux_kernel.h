@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Linux kernel as the rest of libknob sees it: groups are cgroup v2 groups of this machine, and
 // a reservation is the kernel's own. There is no state but the kernel's.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // cgroup.procs holds one living process a line; zombies are left out by Linux itself.
 #include "knob/linux/members.h"
 

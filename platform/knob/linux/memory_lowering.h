@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Taking memory from a group that lives, without killing what lives in it.
 #pragma once
 

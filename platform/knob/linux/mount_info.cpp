@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A line: ID PARENT MAJOR:MINOR ROOT POINT OPTIONS [OPTIONAL...] - TYPE SOURCE SUPEROPTIONS.
 // Blanks and backslashes inside a field are written as three octal digits after a backslash.
 #include "knob/linux/mount_info.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads the text of /proc/self/mountinfo, as far as control groups are concerned.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The layout: a version, flags, then 64-bit numbers in the machine's own byte order, since no
 // record ever leaves the machine.
 #include "knob/linux/record.h"

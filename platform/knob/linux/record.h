@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What Linux has no file for: the record of a group, kept in one extended attribute of its
 // directory, so that it goes when the group goes. A group without one was never set by us.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The lock on the tree: flock on host's directory, taken and given back by scope. Writers exclude
 // everybody; readers that must see several groups at one moment exclude writers.
 #pragma once

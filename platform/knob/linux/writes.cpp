@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // An undo that fails itself cannot be helped: it leaves what a crash would leave, and check() finds
 // that.
 #include "knob/linux/writes.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The writes of one operation, in order, each remembered with what was there before: an operation
 // that fails half-way puts everything back, newest first.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl-exec as a process, on an emulated kernel.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // poolctl-install as its users run it: what it puts in place, what it refuses, and what is left
 // when something fails half way.
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kestrelctl as its users run it: what each command prints, answers and changes, byte for byte.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

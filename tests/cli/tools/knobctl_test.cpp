@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // knobctl as its users run it, on an emulated kernel of 4 CPUs and 8192 MB.
 #include <fcntl.h>
 #include <gmock/gmock.h>

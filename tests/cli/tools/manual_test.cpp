@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The manual pages of the tools and of their configuration files: the examples run, and no command
 // or key is forgotten.
 #include <gmock/gmock.h>

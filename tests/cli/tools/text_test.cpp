@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts from outside as the tools print them.
 #include "shared/text.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Preloaded into a program under test: writes down what it sends to the system log, which it still
 // sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
 // at the second that HOST_CALLS_TIME names and moves only by what the program sleeps. The file that

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reading of the script, and the few answers that depend on the groups.
 #include "model.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The groups and facts that the recording libknob answers with: plain values in memory, read from
 // a script and written out at the end. It admits every reservation; what must be refused, the
 // script's rules refuse.

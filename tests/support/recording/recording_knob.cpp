@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A libknob for tests: it writes down every call, answers from a small model that a script fills,
 // fails the calls that the script names, and watches the parameter lists. README.md beside this
 // file describes its files.

@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* For a test that is linked against the recording libknob instead of running a program with it. */
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A libkestrelconfig for tests: it writes down every lookup and answers it from a script, with
 // values, with nothing, or with an exception. README.md beside this file describes its files.
 #include <cstdlib>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each line is written by one call, so that a program that dies leaves every line before.
 #include "trace.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The file in which a stand-in library writes down, one line each, the calls that it gets.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // No text makes the evaluator hang or overflow its stack: nesting has a bound, and what stays
 // below the bound evaluates within a modest stack.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The evaluator against the plain reading of the same rules: on a million random texts and on
 // every short text. Values must agree bit for bit, faults in message and position.
 #include <gtest/gtest.h>

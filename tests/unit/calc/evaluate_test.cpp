@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What callers of Calc::Evaluate rely on besides the language: where positions point, what the
 // exception is, and that the table is only read.
 #include <gtest/gtest.h>

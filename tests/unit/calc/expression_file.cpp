@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A case is a block of lines between empty lines; nothing here knows the language itself.
 #include "expression_file.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads files of expression cases, whose form is told at the head of expressions.test.
 #pragma once
 

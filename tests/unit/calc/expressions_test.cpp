@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs every case of expressions.test as a test of its own, named by its line, against both
 // readings of the language.
 #include <gtest/gtest.h>

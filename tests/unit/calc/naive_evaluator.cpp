@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each function below is one sentence group of the language's rules: it is given where to start and
 // the cursor so far, and gives back a value and the cursor after it. Nothing is changed in place.
 #include "naive_evaluator.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A second reading of the expression language, for comparison: plain, slow and without regard to
 // the real one. It has no bound on nesting, so texts given to it must be short.
 #pragma once

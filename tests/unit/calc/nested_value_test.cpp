@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Values that lead into themselves, or into ever more values, through aliases: they end with an
 // error that has a place, and soon.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Values tagged "!calc": the scalar form, the mapping form, and how faults get their place.
 #include "calc/node_evaluator.h"
 

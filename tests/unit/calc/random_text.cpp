@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts stay short: a fault in a short text is found as well and read more easily.
 #include "random_text.h"
 

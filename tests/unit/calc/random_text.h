@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Makes expression texts at random: from the grammar, broken on purpose, or of any letters.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs a function on a thread whose stack has a known size.
 #pragma once
 

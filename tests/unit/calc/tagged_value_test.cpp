@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a plain or tagged YAML value comes to as a number and as a flag.
 #include "calc/tagged_value.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What tests of YAML values share: a document from its text, and errors with their place.
 #pragma once
 

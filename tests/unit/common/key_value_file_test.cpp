@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "common/key_value_file.h"
 
 #include <gmock/gmock.h>

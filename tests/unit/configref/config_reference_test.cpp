@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // References to the configuration store: their shape, what is asked of the store in which order,
 // and when the default holds.
 #include "configref/config_reference.h"

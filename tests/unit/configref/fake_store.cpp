@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Stands in for the store's client library under the names that the library exports.
 #include "fake_store.h"
 

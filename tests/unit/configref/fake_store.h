@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A configuration store for tests in the place of the platform's: a table of fields, failures on
 // demand, and a record of what was asked.
 #pragma once

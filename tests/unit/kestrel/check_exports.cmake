@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Compares what LIBRARY exports with the list in EXPECTED, as NM shows it. Inline functions of the
 # public header may or may not be emitted, with the compiler's mood; they are never missed.
 execute_process(COMMAND ${NM} -DC --defined-only ${LIBRARY} OUTPUT_VARIABLE table RESULT_VARIABLE failed)

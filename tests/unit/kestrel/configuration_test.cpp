@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kestrel.conf: its defaults, its keys, and that nothing wrong in it is passed over.
 #include "kestrel/configuration.h"
 

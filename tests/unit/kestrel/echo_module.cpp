@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A module for the tests: each object has one field, the configuration's path.
 #include "kestrel/errors.h"
 #include "kestrel/module.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The exchange format: bytes, types, round trips over every code point, and every refusal.
 #include "kestrel/exchange.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // libkestrelconfig as programs see it: stores, objects, the two reads, and the exceptions.
 #include <gmock/gmock.h>
 #include <sys/wait.h>

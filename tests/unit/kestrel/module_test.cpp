@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The seam for other engines: a module found by its file name, one that is missing, and one that
 // is of another version.
 #include "kestrel/module.h"

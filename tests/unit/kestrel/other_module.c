@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* A shared library that is no module of this version. */
 int kestrelModuleOpen0(void);
 

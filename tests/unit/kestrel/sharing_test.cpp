@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The store between processes: readers beside a writer, readers without rights, and files that
 // SQLite itself could not read where they stand.
 #include <gmock/gmock.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The SQLite file: what is no store, what is a damaged one, what the tables themselves refuse, and
 // the changes.
 #include <gmock/gmock.h>

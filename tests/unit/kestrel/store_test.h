@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A store of a test's own: a folder, a configuration file in it that KESTREL_CONF names, and short
 // ways to put values in and to read them through the library.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The written forms of values: which text is which type, and that printing and reading are inverse.
 #include "kestrel/value.h"
 

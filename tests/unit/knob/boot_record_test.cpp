@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The copy of a boot's facts beside the state: it saves work, and is never believed before the
 // state.
 #include "knob/emulated/boot_record.h"

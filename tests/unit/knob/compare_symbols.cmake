@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Fails when LIBRARY exports anything but the names in LIST, or any of them with a version.
 execute_process(COMMAND ${NM} -D --defined-only ${LIBRARY}
   OUTPUT_VARIABLE lines RESULT_VARIABLE result)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A kernel that remembers what it was asked and answers what the test wants.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One call of the interface is one call of the kernel, and every misuse is a status of its own.
 #include "knob/node_table.h"
 

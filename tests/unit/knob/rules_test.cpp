@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The rules that every kernel shares, as plain functions.
 #include <gtest/gtest.h>
 

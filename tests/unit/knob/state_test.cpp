@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The emulated kernel's state: how it comes to be, what may be wrong with it, and what a boot does.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+/* SPDX-License-Identifier: Apache-2.0 */
 /* The interface as a program in C uses it: every function and every node, once. */
 #include <inttypes.h>
 #include <stdio.h>

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Runs PROGRAM on an emulated kernel of its own, in FOLDER.
 file(REMOVE_RECURSE ${FOLDER})
 file(MAKE_DIRECTORY ${FOLDER})

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Opening directories below one directory, in both ways: with the system's own call, and part by
 // part. A plain folder shows all but what needs a cgroup.
 #include "knob/linux/beneath.h"

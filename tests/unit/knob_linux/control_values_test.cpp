@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The texts of control files at both ends of each range, and nonsense in them.
 #include "knob/linux/control_values.h"
 

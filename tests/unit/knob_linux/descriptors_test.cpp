@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Descriptors that are closed together; control files that are read and written whole.
 #include <fcntl.h>
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What Linux answers, and what libknob's callers get.
 #include "knob/linux/errno_status.h"
 

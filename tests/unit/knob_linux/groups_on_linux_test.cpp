@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What only a real kernel shows of the Linux kernel's own business: groups of somebody else,
 // records and files that were tampered with, rights, other places for the tree. Runs as root of a
 // machine of its own.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is told of a host whose groups lack a controller.
 #include "knob/linux/hierarchy.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The two functions stand before the C library's own, and make the same system calls.
 #include "interrupted_calls.h"
 

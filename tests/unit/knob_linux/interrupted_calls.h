@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Lets a test act in the middle of an operation: just before this process's next write of an
 // attribute or of a control file.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // /proc/self/mountinfo as Linux writes it.
 #include "knob/linux/mount_info.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The record of a group as bytes.
 #include "knob/linux/record.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Named definition files: what is read from them, how the pools are sorted, how every failure
 // names its file, and the lookup of one pool.
 #include "loader/definition_files.h"

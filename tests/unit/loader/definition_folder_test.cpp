@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The folder of definition files, which is the test's own: /etc is another one in the process of
 // each test.
 #include <gtest/gtest.h>

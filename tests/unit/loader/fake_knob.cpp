@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Stands in for the platform's library under the names that it exports.
 #include "fake_knob.h"
 

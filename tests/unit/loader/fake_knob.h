@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's facts for tests, in the place of the platform's library: four records, failures on
 // demand, and a record of what was asked.
 #pragma once

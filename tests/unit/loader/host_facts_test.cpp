@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The variables that expressions may use. They are read once in a process, so every test has one
 // of its own.
 #include "loader/host_facts.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How the installed mark is asked for, call by call, and what each answer of the system means. The
 // system's function is this program's own here.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs a part of a test in a process of its own, for what a process does once, or must not undo.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How one mapping of a definition file becomes a pool record.
 #include "loader/resource_pool.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs scheduler-group operations against the recording libknob, in this process.
 #pragma once
 

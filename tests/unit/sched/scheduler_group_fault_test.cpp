@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each call that a scheduler-group operation makes is made to fail in turn: what is thrown, what
 // the kernel is left with, and that no list is lost.
 #include "sched_fixture.h"

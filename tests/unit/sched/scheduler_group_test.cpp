@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The exact exchange with the kernel that each scheduler-group operation is.
 #include <cstring>
 
