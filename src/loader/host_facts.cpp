@@ -7,8 +7,8 @@
 #include <cstring>
 #include <string_view>
 
-#include "loader/exception.h"
 #include "platform/knob.h"
+#include "yaml/exception.h"
 
 namespace Loader {
 namespace {

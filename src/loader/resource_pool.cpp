@@ -6,9 +6,9 @@
 #include <limits>
 
 #include "calc/tagged_value.h"
-#include "calc/yaml_node.h"
-#include "loader/exception.h"
 #include "loader/host_facts.h"
+#include "yaml/exception.h"
+#include "yaml/node.h"
 
 namespace Loader {
 namespace {
@@ -36,7 +36,7 @@ struct Field {
 
 // There is no key for the CPU's minLimit: it always keeps its default.
 constexpr Field kFields[] = {
-    {"name", [](auto &pool, auto &value) { pool.name = Calc::scalarText(value); }},
+    {"name", [](auto &pool, auto &value) { pool.name = Yaml::scalarText(value); }},
     {"mem", [](auto &pool, auto &value) { pool.mem.min = pool.mem.max = readMemory(value); }},
     {"memMin", [](auto &pool, auto &value) { pool.mem.min = readMemory(value); }},
     {"memMax", [](auto &pool, auto &value) { pool.mem.max = readMemory(value); }},
@@ -68,10 +68,10 @@ ResourcePoolImpl::ResourcePoolImpl(const YAML::Node &item) {
   cpu.max = cpu.minLimit = -1;
   cpu.shares = 1000;
   (void)hostFacts();  // a kernel that does not answer is reported before anything in the item
-  Calc::requireValid(item);
+  Yaml::requireValid(item);
   if (!item.IsMap()) throw Exception(item.Mark(), "expected a map");
   for (const auto &entry : item) {
-    const Field *const field = findField(Calc::scalarText(entry.first));
+    const Field *const field = findField(Yaml::scalarText(entry.first));
     if (field == nullptr) throw Exception(entry.first.Mark(), "invalid rp field");
     field->read(*this, entry.second);
   }
