@@ -7,7 +7,7 @@
 namespace Yaml {
 namespace {
 
-// Older releases build the error from nothing, newer ones from the key that was asked for.
+// Older releases construct the error without arguments, newer ones from the requested key.
 template <typename Error>
 Error plainInvalidNode() {
   if constexpr (std::is_default_constructible_v<Error>) {
@@ -21,8 +21,8 @@ bool isNullWord(const std::string &text) {
   return text == "~" || text == "null" || text == "Null" || text == "NULL";
 }
 
-// Newer releases keep a plain null word under a tag as a scalar, without a trace of whether it was
-// quoted. Older ones make it an untagged null, so that what they keep was quoted and is a text.
+// Newer releases report a null word after a tag as a scalar, quoted or not. Older ones report a
+// plain one as an untagged null, so that a tagged scalar was quoted and is a text.
 bool keepsTaggedNulls() {
   static const bool keeps = YAML::Load("!tag ~").IsScalar();
   return keeps;
