@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Finds the definition files, insists on their installed mark, and gathers their pools.
+// Reads all definition files into one sorted list of pools.
 #include "loader/definition_files.h"
 
 #include <dirent.h>
@@ -23,7 +23,8 @@ struct CloseFolder {
   throw std::system_error(errno, std::generic_category(), kDefinitionFolder);
 }
 
-// The listing's own type counts: links, folders and entries of unknown type are no definitions.
+// An entry's type is the one in the listing. Symbolic links, folders and entries of unknown type
+// are skipped.
 std::vector<std::string> listDefinitionFolder() {
   const std::unique_ptr<DIR, CloseFolder> folder(opendir(kDefinitionFolder));
   if (!folder) throwFolderError();
@@ -49,7 +50,7 @@ bool isInstalled(const std::string &path) {
   return false;
 }
 
-// Newer yaml libraries add the path, which the file error names already.
+// Newer releases of the yaml library add the path, which the file error contains anyway.
 std::string bareMessage(const YAML::Exception &error) {
   if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
   return error.msg;

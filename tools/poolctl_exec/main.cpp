@@ -13,6 +13,7 @@
 #include <memory>
 #include <string>
 
+#include "loader/group_path.h"
 #include "pool_membership.h"
 
 namespace {
@@ -63,7 +64,7 @@ int run(int argc, char **argv) {
   }
 
   try {
-    Exec::joinGroup(Exec::groupPath(pool));
+    Exec::joinGroup(Loader::groupPath(pool));
   } catch (const std::exception &error) {
     return complain(error.what(), kOwnFailure);
   }
