@@ -191,14 +191,14 @@ void Bookkeeper::apply(Group &group, const Held &held, Resource resource,
                        const Allocation &wanted) {
   const Books &books = held.record.books(resource);
   // Without a record nothing above counts the group's minimum yet.
-  const Level own = {held.isStored ? books.allocation : Allocation(), books.childrenSum};
+  const ResourceState own = {held.isStored ? books.allocation : Allocation(), books.childrenSum};
   const int64_t before = reservationOf(own);
   const int64_t after = reservationOf({wanted, own.childrenSum});
   if (after > before && after > machineCapacity(facts_, resource)) refuse("the machine");
   const std::vector<Place> above =
       before == after ? std::vector<Place>()
                       : placesFrom(groups_.parentOf(group), resource, before, after);
-  const std::vector<Level> levels = admitted(own, above, resource, wanted);
+  const std::vector<ResourceState> levels = admitted(own, above, resource, wanted);
 
   Writes writes(groups_);
   if (resource == Resource::kMemory && isLower(wanted.max, books.allocation.max)) {
@@ -214,7 +214,7 @@ void Bookkeeper::releaseChild(Group &parent, const Held &child) {
   if (!child.isStored) return;
   for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
     const Books &books = child.record.books(resource);
-    Level own;
+    ResourceState own;
     own.allocation.min = reservationOf({books.allocation, books.childrenSum});
     if (own.allocation.min == 0) continue;
     const std::vector<Place> above =
@@ -261,9 +261,10 @@ std::vector<Bookkeeper::Place> Bookkeeper::placesFrom(GroupPtr group, Resource r
   return places;
 }
 
-std::vector<Level> Bookkeeper::admitted(const Level &own, const std::vector<Place> &above,
-                                        Resource resource, const Allocation &wanted) const {
-  std::vector<Level> levels = {own};
+std::vector<ResourceState> Bookkeeper::admitted(const ResourceState &own,
+                                                const std::vector<Place> &above, Resource resource,
+                                                const Allocation &wanted) const {
+  std::vector<ResourceState> levels = {own};
   for (const Place &place : above) {
     const Books &books = place.held.record.books(resource);
     levels.push_back({books.allocation, books.childrenSum});
@@ -306,7 +307,7 @@ void Bookkeeper::writeOwn(Writes &writes, Group &group, const Held &held, Resour
 
 // levels: what admission made of the group that changes, then of those places that change.
 void Bookkeeper::writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
-                           const std::vector<Level> &levels) const {
+                           const std::vector<ResourceState> &levels) const {
   const size_t changed = levels.size() - 1;
   const auto writeSum = [&](size_t i) {
     const auto &[group, held] = above[i];
