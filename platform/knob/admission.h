@@ -12,7 +12,7 @@
 
 namespace Knob {
 
-// What a group has of one resource, and what its children reserve of it.
+// What a group has been given of one resource, and what its children reserve of it.
 struct ResourceState {
   Allocation allocation;
   int64_t childrenSum = 0;  // of the children's reservations

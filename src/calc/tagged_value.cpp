@@ -5,9 +5,9 @@
 #include <string>
 
 #include "calc/node_evaluator.h"
-#include "calc/yaml_node.h"
 #include "configref/config_reference.h"
-#include "loader/exception.h"
+#include "yaml/exception.h"
+#include "yaml/node.h"
 
 namespace {
 
@@ -62,9 +62,9 @@ Value plainValue(const YAML::Node &node) {
 
 template <typename Target>
 typename Target::Value convert(const YAML::Node &node, const Calc::VariableTable &variables) {
-  Calc::requireValid(node);
+  Yaml::requireValid(node);
   const Nesting nesting(node);
-  const std::string tag = Calc::tagOf(node);
+  const std::string tag = Yaml::tagOf(node);
   if (tag == "!calc") return Target::fromCalc(Calc::EvaluateNode(node, variables));
   if (tag == "!config") return Target::fromConfig(node, variables);
   if (tag != "?") throw Loader::Exception(node.Mark(), "Unexpected tag " + tag);

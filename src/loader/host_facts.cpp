@@ -5,9 +5,9 @@
 #include <cstring>
 #include <string_view>
 
-#include "loader/exception.h"
 #include "platform/knob.h"
 #include "platform/knob_records.h"
+#include "yaml/exception.h"
 
 namespace Loader {
 namespace {

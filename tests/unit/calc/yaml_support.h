@@ -9,7 +9,7 @@
 #include <string>
 #include <typeinfo>
 
-#include "loader/exception.h"
+#include "yaml/exception.h"
 
 // Where an error points to, with lines and columns from 1 as a user counts them.
 struct Place {

@@ -9,6 +9,7 @@
 #include <string>
 #include <type_traits>
 
+#include "fake_knob.h"
 #include "fake_store.h"
 #include "yaml_support.h"
 
@@ -338,6 +339,21 @@ TEST(PoolItem, EntryOfAMappingIsInvalidAsAnItem) {
 
 TEST(PoolItem, TagOfTheMappingIsNotLookedAt) {
   EXPECT_EQ("host/opt/a", pool("!calc {name: a}").name);
+}
+
+TEST(ResourcePool, OfAnotherMachineAsksNoKernel) {
+  const size_t before = FakeKnob::instance().calls.size();
+  const ResourcePoolImpl read(yaml("{name: a, cpuMin: !calc numPCPUs * 2}"), {{"numPCPUs", 3.0F}});
+  EXPECT_EQ(6, int32_t{read.cpu.min});
+  EXPECT_EQ(before, FakeKnob::instance().calls.size());
+}
+
+TEST(ResourcePool, EachListedKeyIsTaken) {
+  for (const std::string &key : Loader::poolKeys()) {
+    const std::string value = key == "isEnabled" ? "true" : "1";
+    EXPECT_NO_THROW(pool("{name: a, " + key + ": " + value + "}")) << key;
+  }
+  EXPECT_EQ(10U, Loader::poolKeys().size());
 }
 
 }  // namespace
