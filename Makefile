@@ -2,7 +2,7 @@
 # The front door. Everything that is done here is done by a script or by CMake; see CONTRIBUTING.md.
 # What a target needs of the system is installed first (root) or named (anybody else).
 
-.PHONY: all demo test bench coverage asan ubsan lint package install clean
+.PHONY: all demo test bench bench-icount coverage asan ubsan lint package install clean
 MAKEFLAGS += --no-print-directory
 PROGRAMS = src/all platform/all tools/all
 
@@ -24,6 +24,12 @@ bench:
 	@scripts/install-deps build bench
 	@scripts/build release $(PROGRAMS) bench_programs
 	@scripts/run-bench
+
+# What commands cost in instructions, whatever this machine is busy with.
+bench-icount:
+	@scripts/install-deps build smp
+	@scripts/build release $(PROGRAMS) icount_programs
+	@scripts/run-bench-icount
 
 coverage:
 	@scripts/install-deps build test coverage
