@@ -60,10 +60,11 @@ void writeDefinitions(const fs::path &path, int pools) {
 
 void writeParserConfiguration(const fs::path &path, int pools) {
   std::ofstream file(path);
-  for (int i = 0; i < pools; ++i)
+  for (int i = 0; i < pools; ++i) {
     file << "group parser/opt/" << nameOf(i) << " {\n  memory {\n    memory.min = \""
          << minimumMB(i) * 1048576 << "\";\n    memory.max = \"67108864\";\n  }\n  cpu {\n"
          << "    cpu.max = \"50000 100000\";\n    cpu.weight = \"200\";\n  }\n}\n";
+  }
 }
 
 void passOnControllers(const fs::path &group) {
