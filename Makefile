@@ -2,8 +2,8 @@
 # The front door. Scripts and CMake do the work; see CONTRIBUTING.md. Each target first installs the
 # Debian packages that it needs (as root) or names them. A "##" is the target's line in "make help".
 
-.PHONY: all demo test check bench coverage asan ubsan lint tidy warnings package install uninstall \
-        clean help
+.PHONY: all demo test check bench bench-icount coverage asan ubsan lint tidy warnings package \
+        install uninstall clean help
 MAKEFLAGS += --no-print-directory
 PROGRAMS = src/all platform/all tools/all
 
@@ -47,6 +47,11 @@ bench: ## speed and memory, against bare programs
 	@scripts/build release $(PROGRAMS) bench_programs
 	@scripts/run-bench
 
+bench-icount: ## what commands cost in instructions, in a QEMU machine
+	@scripts/install-deps build smp
+	@scripts/build release $(PROGRAMS) icount_programs
+	@scripts/run-bench-icount
+
 package: ## a Debian package in build/package
 	@scripts/install-deps build package
 	@scripts/build package $(PROGRAMS)
@@ -63,4 +68,4 @@ clean: ## removes the folder build
 	@rm -rf build
 
 help: ## this list
-	@awk -F ':.*## ' '/^[a-z ]+:.*## / { printf "make %-12s %s\n", $$1, $$2 }' Makefile
+	@awk -F ':.*## ' '/^[a-z -]+:.*## / { printf "make %-13s %s\n", $$1, $$2 }' Makefile

@@ -26,6 +26,7 @@ constexpr int kMaxLevels = 5000;
 constexpr float kNoAddend = -0.0F;
 
 constexpr const char *kTooDeep = "expression nested too deeply";
+constexpr const char *kNoEnd = "expression never ends: True or False after an operator";
 
 bool isSpace(char c) {
   return std::isspace(static_cast<unsigned char>(c)) != 0;
@@ -130,10 +131,10 @@ void Reader::enterLevel(const char *place) {
   if (++level_ > kMaxLevels) fail(kTooDeep, place);
 }
 
-// Behind an operator, "True" and "False" leave the cursor at that operator, which would be read
+// After an operator, "True" and "False" leave the cursor at that operator, which would be read
 // again without end.
 void Reader::takeOperator(const char *place) {
-  if (place < nextOperator_) fail(kTooDeep, place);
+  if (place < nextOperator_) fail(kNoEnd, place);
   nextOperator_ = place + 1;
 }
 

@@ -96,6 +96,18 @@ TEST_F(Sched, AnAllZeroMemoryRecordSendsItsSharesToo) {
                   "input=[\"min=0\",\"max=0\",\"minLimit=0\",\"shares=0\"] output=0 -> 0"});
 }
 
+TEST_F(Sched, SettingsOfMinusOneAreSentButForTheShares) {
+  succeed([] {
+    ::Sched::setMemAllocation(2, mem(-1, -1, -1, -1));
+    ::Sched::setCpuAllocation(2, cpu(-1, -1, -1, -1));
+  });
+  EXPECT_EQ(world.groupCalls(),
+            (Calls{"KNOB_Set sched_groups_memAllocationInMB instance=[2] "
+                   "input=[\"min=-1\",\"max=-1\",\"minLimit=-1\"] output=0 -> 0",
+                   "KNOB_Set sched_groups_cpuAllocationInPct instance=[2] "
+                   "input=[\"min=-1\",\"max=-1\",\"minLimit=-1\"] output=0 -> 0"}));
+}
+
 TEST_F(Sched, MemorySettingsKeepTheirSixtyFourBits) {
   succeed([] {
     ::Sched::setMemAllocation(
