@@ -13,6 +13,7 @@
 #include "commands/stop_signals.h"
 #include "console/message.h"
 #include "console/result.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -41,7 +42,7 @@ void disableOnce(const std::string &name, const Options &options) {
 }
 
 bool isBusy(const Sched::Exception &failure) {
-  return failure.status == Sched::kStatusMemoryBusy || failure.status == Sched::kStatusBusy;
+  return failure.status == KNOB_STATUS_MEMORY_BUSY || failure.status == KNOB_STATUS_BUSY;
 }
 
 // Returns false if the group is busy and the wait is not over.
@@ -49,12 +50,12 @@ bool tryDisable(const std::string &name, const Options &options) {
   try {
     disableOnce(name, options);
   } catch (const Sched::Exception &failure) {
-    if (failure.status == Sched::kStatusNotFound) {
+    if (failure.status == KNOB_STATUS_NOT_FOUND) {
       std::cout << Console::resultText(name + ": " + failure.what()) << std::endl;
       return true;
     }
     if (isBusy(failure)) {
-      if (options.deadlineSeconds < time(nullptr)) throw Sched::Exception(name, Sched::kStatusBusy);
+      if (options.deadlineSeconds < time(nullptr)) throw Sched::Exception(name, KNOB_STATUS_BUSY);
       return false;
     }
     // The entry point reports it a second time, without the name.

@@ -10,6 +10,7 @@
 #include "commands/stop_signals.h"
 #include "console/message.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -36,7 +37,7 @@ void enable(const Loader::ResourcePoolImpl &pool) {
   try {
     restoreMemory(pool);
   } catch (const Sched::Exception &failure) {
-    if (failure.status == Sched::kStatusNotFound) {
+    if (failure.status == KNOB_STATUS_NOT_FOUND) {
       Sched::createGroup(pool.name, pool.mem, pool.cpu);
     } else {
       Console::printError(pool.name, ": ", failure.what());

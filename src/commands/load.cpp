@@ -8,6 +8,7 @@
 #include "commands/stop_signals.h"
 #include "console/message.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -25,7 +26,7 @@ bool create(const Loader::ResourcePoolImpl &pool, bool quiet) {
   try {
     Sched::createGroup(pool.name, pool.mem, pool.cpu);
   } catch (const Sched::Exception &failure) {
-    if (failure.status != Sched::kStatusExists) throw;
+    if (failure.status != KNOB_STATUS_EXISTS) throw;
     if (!quiet) Console::printError(pool.name, " exists; skipping.");
     return false;
   }

@@ -8,6 +8,7 @@
 #include "commands/stop_signals.h"
 #include "console/message.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -26,7 +27,7 @@ bool deletePool(Loader::ResourcePoolImpl &pool) {
     Sched::getCpuAllocation(id, &pool.cpu);
     Sched::deleteGroup(id);
   } catch (const Sched::Exception &failure) {
-    if (failure.status != Sched::kStatusNotFound) throw;
+    if (failure.status != KNOB_STATUS_NOT_FOUND) throw;
     return false;
   }
   return true;
