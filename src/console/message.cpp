@@ -42,7 +42,6 @@ class TerminalLine {
   void add(std::string_view text) {
     while (!text.empty()) {
       const Character character = firstCharacter(text);
-      if (character.length * kEscapeLength > buffer_.size() - used_) flush();
       for (size_t i = 0; i < character.length; ++i) addByte(text[i], character.isControl);
       text.remove_prefix(character.length);
     }
@@ -51,6 +50,7 @@ class TerminalLine {
 
  private:
   void addByte(char byte, bool escaped) {
+    if (buffer_.size() - used_ < kEscapeLength) flush();
     if (escaped) {
       writeEscape(static_cast<unsigned char>(byte), buffer_.data() + used_);
       used_ += kEscapeLength;
