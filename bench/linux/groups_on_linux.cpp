@@ -36,11 +36,12 @@ constexpr double kGrowthGoal = 1.2;
 
 void writeParserConfiguration(const fs::path &path, int pools) {
   std::ofstream file(path);
-  for (int i = 0; i < pools; ++i)
+  for (int i = 0; i < pools; ++i) {
     file << "group parser/opt/" << Bench::poolName(i) << " {\n  memory {\n    memory.min = \""
          << Bench::poolMinimumMB(i) * 1048576
          << "\";\n    memory.max = \"67108864\";\n  }\n  cpu {\n"
          << "    cpu.max = \"50000 100000\";\n    cpu.weight = \"200\";\n  }\n}\n";
+  }
 }
 
 struct Result {

@@ -31,18 +31,23 @@ constexpr const char *kNoEnd = "expression never ends: True or False after an op
 bool isSpace(char c) {
   return std::isspace(static_cast<unsigned char>(c)) != 0;
 }
+
 bool isNameStart(char c) {
   return std::isalpha(static_cast<unsigned char>(c)) != 0 || c == '_';
 }
+
 bool isNamePart(char c) {
   return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_' || c == '.';
 }
+
 bool startsWith(const char *text, const char *word) {
   return std::strncmp(text, word, std::strlen(word)) == 0;
 }
+
 bool isTrue(float value) {
   return value != 0.0F;
 }
+
 float truth(bool value) {
   return value ? 1.0F : 0.0F;
 }
@@ -57,10 +62,12 @@ const char *skipSpace(const char *at) {
 [[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
+
 [[noreturn, gnu::noinline]] void failExpected(const char *name, const char *what,
                                               const char *position) {
   throw Exception(std::string(name) + " expected " + what, position);
 }
+
 [[noreturn, gnu::noinline]] void failUnknown(const char *name, const char *after) {
   throw Exception("unexpected symbol: " + std::string(name, after), name);
 }

@@ -23,6 +23,7 @@ const Calc::VariableTable kFacts = {{"numPCPUs", 12.0f}, {"isVm", 0.0f}, {"nan",
 float number(const std::string &text) {
   return NodeToFloat(yaml(text), kFacts);
 }
+
 bool flag(const std::string &text) {
   return NodeToBool(yaml(text), kFacts);
 }

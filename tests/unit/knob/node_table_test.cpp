@@ -21,12 +21,15 @@ KNOB_ParamList list(ListKind kind, std::vector<ListEntry> entries) {
   const size_t size = entries.size();
   return {kind, size, std::move(entries)};
 }
+
 KNOB_ParamList group(int64_t id = 5) {
   return list(ListKind::kInstance, {id});
 }
+
 KNOB_ParamList input(std::vector<ListEntry> entries) {
   return list(ListKind::kInput, std::move(entries));
 }
+
 ListEntry text(const char *bytes) {
   return std::string(bytes);
 }

@@ -58,6 +58,7 @@ void expectRefused(const std::string &text, Place place, const std::string &mess
 int64_t memMax(const std::string &value) {
   return poolWith("memMax: " + value).mem.max;
 }
+
 int32_t cpuMax(const std::string &value) {
   return poolWith("cpuMax: " + value).cpu.max;
 }
