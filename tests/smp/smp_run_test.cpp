@@ -83,6 +83,22 @@ TEST_F(SmpRun, AMachineWithoutAVerdictFailsAndShowsItsConsole) {
   EXPECT_THAT(result.err, HasSubstr("ended without a verdict"));
 }
 
+TEST_F(SmpRun, AMachineThatQemusOwnFaultEndedBootsAgain) {
+  qemu(
+      "[ -e $0.first ] && { echo 'status 0' >$status; exit; }\n"
+      "touch $0.first; echo 'Oops: int3: 0000 [#1] PREEMPT SMP' >$console; echo half >$out");
+  const auto result = run();
+  EXPECT_EQ(result.status, 0);
+  EXPECT_EQ(result.out, "");
+  EXPECT_THAT(result.err, HasSubstr("attempt 1: QEMU executed a breakpoint"));
+}
+
+TEST_F(SmpRun, ThatFaultThreeTimesIsAFailure) {
+  qemu("echo 'Oops: int3: 0000 [#1] PREEMPT SMP' >$console; echo x >>$0.boots");
+  EXPECT_EQ(run().status, 125);
+  EXPECT_EQ(::Test::readFile(bin() / "qemu-system-x86_64.boots"), "x\nx\nx\n");
+}
+
 TEST_F(SmpRun, AMachineThatQemuCannotStartFailsWithQemusReason) {
   qemu("echo 'cannot set up guest memory' >&2; exit 1");
   const auto result = run();
