@@ -9,8 +9,8 @@
 
 #include "knob/linux/control_values.h"
 #include "knob/linux/fixed_groups.h"
-#include "knob/linux/memory_lowering.h"
-#include "knob/linux/writes.h"
+#include "knob/linux/lowering.h"
+#include "knob/linux/undoable_writes.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
 #include "knob/signature.h"

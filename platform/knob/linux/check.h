@@ -5,8 +5,8 @@
 #include <string>
 #include <vector>
 
-#include "knob/linux/bookkeeper.h"
-#include "knob/linux/groups.h"
+#include "knob/linux/allocations.h"
+#include "knob/linux/cgroup_tree.h"
 
 namespace Knob::Linux {
 

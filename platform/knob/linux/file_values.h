@@ -5,8 +5,8 @@
 #include <array>
 #include <string>
 
-#include "knob/linux/control_file.h"
-#include "knob/linux/groups.h"
+#include "knob/linux/cgroup_files.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/record.h"
 
 namespace Knob::Linux {

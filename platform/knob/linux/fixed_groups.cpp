@@ -4,7 +4,7 @@
 // only as long as groups of the older one remain.
 #include "knob/linux/fixed_groups.h"
 
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/linux/record.h"
 #include "knob/names.h"
 #include "knob/signature.h"

@@ -8,7 +8,7 @@
 #include <string_view>
 
 #include "knob/kernel.h"
-#include "knob/linux/groups.h"
+#include "knob/linux/cgroup_tree.h"
 
 namespace Knob::Linux {
 

@@ -11,9 +11,9 @@
 #include <climits>
 
 #include "knob/linux/beneath.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/control_values.h"
 #include "knob/linux/errno_status.h"
-#include "knob/linux/groups.h"
 #include "knob/names.h"
 
 namespace Knob::Linux {

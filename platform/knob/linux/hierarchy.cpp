@@ -13,7 +13,7 @@
 
 #include "common/read_file.h"
 #include "knob/linux/beneath.h"
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/linux/control_values.h"
 
 namespace Knob::Linux {

@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "knob/kernel.h"
-#include "knob/linux/bookkeeper.h"
-#include "knob/linux/groups.h"
+#include "knob/linux/allocations.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/tree_lock.h"
 
 namespace Knob::Linux {

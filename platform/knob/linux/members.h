@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <vector>
 
-#include "knob/linux/groups.h"
+#include "knob/linux/cgroup_tree.h"
 
 namespace Knob::Linux {
 

@@ -7,7 +7,7 @@
 #include <cerrno>
 #include <filesystem>
 
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/linux/descriptor_set.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/members.h"

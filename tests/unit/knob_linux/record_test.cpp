@@ -7,7 +7,7 @@
 #include <cstring>
 #include <string>
 
-#include "knob/linux/bookkeeper.h"
+#include "knob/linux/allocations.h"
 #include "knob/linux/control_values.h"
 
 namespace Knob::Linux {

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // Linux kills at once when memory.max goes below what cannot be reclaimed; memory.high never kills.
 // So memory.high is lowered first, and memory.max follows only when the memory has come.
-#include "knob/linux/memory_lowering.h"
+#include "knob/linux/lowering.h"
 
 #include <string>
 

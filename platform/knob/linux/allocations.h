@@ -9,10 +9,10 @@
 #include <vector>
 
 #include "knob/admission.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/file_values.h"
-#include "knob/linux/groups.h"
 #include "knob/linux/record.h"
-#include "knob/linux/writes.h"
+#include "knob/linux/undoable_writes.h"
 
 namespace Knob::Linux {
 

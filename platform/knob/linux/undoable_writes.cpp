@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // An undo that fails itself cannot be helped: it leaves what a crash would leave, and check() finds
 // that.
-#include "knob/linux/writes.h"
+#include "knob/linux/undoable_writes.h"
 
 namespace Knob::Linux {
 

@@ -14,7 +14,7 @@
 #include <vector>
 
 #include "knob/kernel.h"
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/linux/descriptor_set.h"
 #include "knob/linux/hierarchy.h"
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // Files are opened for writing without creating or truncating: a name that is no control file must
 // stay an error.
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 
 #include <fcntl.h>
 #include <sys/xattr.h>

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // From paths and ids to groups in use, and which of them stay open.
-#include "knob/linux/groups.h"
+#include "knob/linux/cgroup_tree.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -2,9 +2,9 @@
 // Taking memory from a group that lives, without killing what lives in it.
 #pragma once
 
-#include "knob/linux/bookkeeper.h"
-#include "knob/linux/groups.h"
-#include "knob/linux/writes.h"
+#include "knob/linux/allocations.h"
+#include "knob/linux/cgroup_tree.h"
+#include "knob/linux/undoable_writes.h"
 
 namespace Knob::Linux {
 

@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // Growing is written from the top down and shrinking from the bottom up, so that a process killed
 // in between leaves too much reserved, never too little.
-#include "knob/linux/bookkeeper.h"
+#include "knob/linux/allocations.h"
 
 #include <algorithm>
 #include <chrono>
@@ -10,7 +10,7 @@
 
 #include "knob/allocation.h"
 #include "knob/linux/control_values.h"
-#include "knob/linux/memory_lowering.h"
+#include "knob/linux/lowering.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/peaks.h"
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "knob/linux/groups.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/record.h"
 
 namespace Knob::Linux {
