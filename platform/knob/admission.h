@@ -20,6 +20,11 @@ struct ResourceState {
 
 int64_t reservationOf(const ResourceState &state);
 
+// The children's sum after the reservation of one child went from before to after. Saturates: a
+// larger number would exceed every machine too. A before that the sum cannot contain, which only
+// another program writes, counts as the whole sum.
+int64_t changedSum(int64_t sum, int64_t before, int64_t after);
+
 // How much can be reserved in all: MB of physical memory, or 100 percent for each CPU.
 int64_t machineCapacity(const HostFacts &facts, Resource resource);
 

@@ -1,88 +1,65 @@
 // SPDX-License-Identifier: Apache-2.0
-// What groups have been given: reading it from their records or files, changing it, and keeping the
-// sums and the protection of everything above in step. The caller holds the lock on the tree, but
-// for reading, and where it is said that none is needed.
+// Changes what groups have been given, and keeps the sums and the protection of the groups above
+// correct. Callers hold the exclusive TreeLock, except where a function says otherwise.
 #pragma once
 
 #include <optional>
 #include <string>
 #include <vector>
 
-#include "knob/admission.h"
 #include "knob/linux/cgroup_tree.h"
-#include "knob/linux/file_values.h"
+#include "knob/linux/control_values.h"
 #include "knob/linux/record.h"
 #include "knob/linux/undoable_writes.h"
 
 namespace Knob::Linux {
 
-// A group's books, and whether they stand in a record of its own.
-struct Held {
-  Record record;  // what the files say, where there is no record
-  bool isStored = false;
-  bool isDamaged = false;  // there is a record that cannot be read
-};
-
-// A control file that should hold something else.
+// A control file whose text is not what the record asks for.
 struct Deviation {
-  Control control;
-  std::string expected;
+  ControlText expected;
   std::optional<std::string> actual;  // absent: there is no such file
 };
-
-// The sum of two amounts of which the second is not negative. Amounts beyond every machine, as only
-// a record written by somebody else holds them, stay that.
-int64_t saturatedSum(int64_t left, int64_t right);
 
 // "memory.max is 5, not max".
 std::string textOf(const Deviation &deviation);
 
-class Bookkeeper {
+class AllocationManager {
  public:
-  Bookkeeper(Groups &groups, const HostFacts &facts) : groups_(groups), facts_(facts) {}
+  AllocationManager(CgroupTree &tree, const HostFacts &facts) : tree_(tree), facts_(facts) {}
 
-  Held read(Group &group) const;
-
-  // Checks the whole change, then applies the whole. Throws KernelError: bad parameter, reservation
-  // refused, memory busy.
+  // Checks the whole change, then applies the whole change. Throws KernelError: bad parameter,
+  // reservation refused, memory busy, failure (a record that cannot be read).
   void change(Group &group, Resource resource, const AllocationChange &change);
 
-  // The first CPU settings of a new group, without the lock: the record first, which cannot be made
-  // when there is one, then the files, then a look at whether the record is still that one. False,
-  // and nothing is changed: somebody else has made the record, or it is not such a change; change()
-  // is to be called. Throws KernelError: bad parameter, not found.
-  bool changeNew(Group &group, const AllocationChange &change);
+  // Removes a group, and its reservations from the sums of the groups above. Throws KernelError:
+  // busy, failure; nothing has changed.
+  void remove(Group &group, Group &parent);
 
-  // Makes the record of a new group that has been given something. Needs no lock.
-  void recordNew(Group &group) noexcept;
+  // The control files that differ from the record. Needs no more than the shared lock.
+  std::vector<Deviation> deviations(const Group &group, const Record &record) const;
 
-  // Takes a deleted child's reservations out of its parent and all above. child: as it was.
-  void releaseChild(Group &parent, const Held &child);
-
-  // What the files of a group should hold according to its record.
-  std::vector<Deviation> deviations(Group &group, const Record &record) const;
+  int64_t capacity(Resource resource) const { return machineCapacity(facts_, resource); }
 
  private:
-  struct Place;
-  Held readToChange(Group &group) const;
-  void restoreCpu(Group &group);
-  void takeBackCpu(Group &group, const Record &made) noexcept;
-  std::vector<Deviation> compare(Group &group, const Record &record) const;
-  void changeHeld(Group &group, Held held, Resource resource, const AllocationChange &change);
-  // A group that somebody else gave a minimum, and that now gets a record, is one more reservation:
-  // whether it was, and is counted now.
-  bool count(Group &group, const Held &held);
-  void apply(Group &group, const Held &held, Resource resource, const Allocation &wanted);
-  std::vector<Place> placesFrom(GroupPtr group, Resource resource, int64_t before, int64_t after);
-  std::vector<ResourceState> admitted(const ResourceState &own, const std::vector<Place> &above,
-                                      Resource resource, const Allocation &wanted) const;
-  void writeControls(Writes &writes, Group &group, const Values &from, const Values &to) const;
-  void writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
-                const Allocation &wanted) const;
-  void writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
-                 const std::vector<ResourceState> &levels) const;
+  // A group above the one that changes.
+  struct Ancestor {
+    GroupPtr group;
+    StoredRecord before;
+    Record after;
+  };
 
-  Groups &groups_;
+  // Adds to the ancestors' sums the minimum of a group that another program set and no record
+  // counts. Returns whether it did; the caller must then read the record again.
+  bool countForeignMinimum(Group &group, const StoredRecord &stored);
+  StoredRecord readToChange(Group &group);
+  void apply(Group &group, const StoredRecord &stored, Resource resource, const Allocation &wanted);
+  void admitInto(std::vector<Ancestor> &ancestors, Group &group, Resource resource,
+                 const ResourceState &own, const Allocation &wanted);
+  ControlTexts currentTexts(const Group &group, const StoredRecord &stored,
+                            Resource resource) const;
+  void writeAncestor(UndoableWrites &writes, const Ancestor &ancestor) const;
+
+  CgroupTree &tree_;
   const HostFacts &facts_;
 };
 

@@ -1,35 +1,35 @@
 // SPDX-License-Identifier: Apache-2.0
-// The files of a group's directory, and the directory's attributes: reading and writing whole, with
-// errno never lost.
+// The files and attributes of a cgroup directory: reading and writing whole ones, and the one place
+// that turns an errno into a status.
 #pragma once
 
 #include <array>
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
-#include "common/unique_fd.h"
+#include "knob/kernel.h"
 
 namespace Knob::Linux {
 
-// The files that a change of settings writes.
+// The files that hold a group's allocations.
 enum class Control { kMemoryMin, kMemoryMax, kCpuMax, kCpuWeight };
 
-// name: as Linux has it; fresh: what it holds in a group just made.
-struct ControlRow {
+struct ControlInfo {
   const char *name;
-  const char *fresh;
+  const char *initialText;  // in a new group
 };
 inline constexpr std::array kControls = {
-    ControlRow{"memory.min", "0"}, ControlRow{"memory.max", "max"},
-    ControlRow{"cpu.max", "max 100000"}, ControlRow{"cpu.weight", "100"}};
+    ControlInfo{"memory.min", "0"}, ControlInfo{"memory.max", "max"},
+    ControlInfo{"cpu.max", "max 100000"}, ControlInfo{"cpu.weight", "100"}};
 
-constexpr const ControlRow &rowOf(Control control) {
+constexpr const ControlInfo &infoOf(Control control) {
   return kControls[static_cast<size_t>(control)];
 }
 
-// The files that are looked at, or written on rarer occasions.
 inline constexpr const char *kControllersFile = "cgroup.controllers";
 inline constexpr const char *kEventsFile = "cgroup.events";
 inline constexpr const char *kMembersFile = "cgroup.procs";
@@ -39,28 +39,42 @@ inline constexpr const char *kMemoryCurrentFile = "memory.current";
 inline constexpr const char *kMemoryHighFile = "memory.high";
 inline constexpr const char *kMemoryReclaimFile = "memory.reclaim";
 
-// 0, or the errno. An opened descriptor stays the caller's.
-int openForWriting(int directory, const char *name, Platform::UniqueFd &file);
+// An unexpected errno is a failure, never a success.
+Status statusOf(int error) noexcept;
 
-// One write of the whole text; a short one is EIO. 0, or the errno.
-int writeWhole(int file, std::string_view text);
+// Throws the KernelError of an errno: "WHAT: system's text".
+[[noreturn]] void fail(int error, const std::string &what);
 
-// Opens, writes, closes. 0, or the errno.
+// The same with another status than that of the errno.
+[[noreturn]] void fail(Status status, int error, const std::string &what);
+
+[[noreturn]] void noSuchGroup();
+
+// Opens the file, writes the text in one call, closes. Never creates or truncates; a short write is
+// EIO. Returns 0 or the errno.
 int writeControl(int directory, const char *name, std::string_view text);
 
-// Without the line's end. Throws KernelError.
+// The text without the line feed at its end. Throws KernelError.
 std::string readControl(int directory, const char *name);
 
-// Nothing when there is no such file: the controller is not passed on, or the kernel is older.
+// The same; nothing when there is no such file, because its controller is not enabled or the kernel
+// is older.
 std::optional<std::string> readControlIfAny(int directory, const char *name);
+
+bool hasControl(int directory, const char *name);
+
+// The living processes of the group itself, without those of another pid namespace. Throws
+// KernelError.
+std::vector<int64_t> readMembers(int directory);
+
+// The process ids in the text of cgroup.procs, one a line.
+std::vector<int64_t> parseMembers(std::string_view text);
 
 // An extended attribute of the directory; nothing when it has none. Throws KernelError.
 std::optional<std::string> readAttribute(int directory, const char *name);
 
-// Throw KernelError; for kNew: exists, when the directory has such an attribute already.
-enum class Attribute { kNew, kAny };
-void writeAttribute(int directory, const char *name, std::string_view value,
-                    Attribute kind = Attribute::kAny);
+// Throw KernelError.
+void writeAttribute(int directory, const char *name, std::string_view value);
 void removeAttribute(int directory, const char *name);
 
 }  // namespace Knob::Linux

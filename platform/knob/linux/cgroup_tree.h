@@ -1,40 +1,34 @@
 // SPDX-License-Identifier: Apache-2.0
-// The directories of groups: from paths and ids to open descriptors, and back up to host. The
-// descriptors of the groups used last are kept; a descriptor stays with its group for ever, so a
-// group that was deleted answers ENOENT or ENODEV even when another one of its name was made.
+// The tree of groups below the folder that holds host: from paths and ids to open directories and
+// up to host, and what is done with a directory as a whole. The directories of the groups used last
+// stay open.
+//
+// Functions that take a group throw KernelError: not found, when it was deleted.
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
 
+#include "common/unique_fd.h"
 #include "knob/kernel.h"
 #include "knob/linux/cgroup_files.h"
-#include "knob/linux/descriptor_set.h"
 #include "knob/linux/hierarchy.h"
 
 namespace Knob::Linux {
 
-// One group in use. Its descriptors live as long as it does.
+// An open group.
 struct Group {
   GroupId id = 0;
-  GroupId parent = 0;  // 0: not looked at yet, or host
-  std::string name;    // empty: not looked at yet
-  int directory = -1;
-  std::array<int, kControls.size()> controls = {-1, -1, -1, -1};  // opened for writing
-  int events = -1;  // cgroup.events, opened for reading
-  // Of a group that this process made, and that has no record as far as it knows: its memory
-  // maximum in MB, all that it has been given; -1: no limit.
-  std::optional<int64_t> unrecordedMax;
-  bool passesOn = false;   // this process has seen to it that children get their controllers
-  bool hasMemory = false;  // this process has seen that its memory maximum is not 0
+  GroupId parent = 0;  // 0: not known yet, or host
+  std::string name;    // empty: not known yet
+  Platform::UniqueFd directory;
   uint64_t lastUse = 0;
-  DescriptorSet descriptors;  // owns all of the above
+
+  int fd() const { return directory.get(); }
 };
 using GroupPtr = std::shared_ptr<Group>;
 
@@ -43,78 +37,72 @@ struct Child {
   std::string name;
 };
 
-class Groups {
+class CgroupTree {
  public:
-  explicit Groups(Hierarchy hierarchy);
+  explicit CgroupTree(Hierarchy hierarchy);
 
   const Hierarchy &hierarchy() const { return hierarchy_; }
 
-  // The group at a path of good names; empty when there is none. Throws KernelError.
+  // The group at a path whose components are group names; empty when there is none. Throws
+  // KernelError.
   GroupPtr lookUp(std::string_view path);
 
-  // The group host as it is now; empty when there is none. Throws KernelError.
+  // host; empty when there is none. Throws KernelError.
   GroupPtr host();
 
-  // The host of the groups that are open. Empty when there is none. Throws KernelError.
-  GroupPtr openHost();
-
-  // The group of an id, which must be host or below it. Throws KernelError (not found).
+  // The group of an id, which must be host or below it. A group that is open may have been deleted
+  // meanwhile. Throws KernelError (not found).
   GroupPtr find(GroupId id);
 
-  // The group above; empty for host.
+  // The group above; empty for host. Throws KernelError.
   GroupPtr parentOf(Group &group);
 
-  // Makes a directory. The parent passes its controllers on already. Throws KernelError.
+  // Makes a group with the memory and cpu controllers. Throws KernelError: exists, busy (processes
+  // are in the parent), out of memory, not supported (an administrator's limit); nothing is made.
   GroupPtr make(Group &parent, std::string_view name);
 
-  // Makes host, with the controllers passed on to it. Throws KernelError.
+  // Makes host. Throws KernelError.
   GroupPtr makeHost();
 
-  // Removes the directory. Throws KernelError (busy, not found).
+  // Removes the group, and disables the controllers below its parent when it was the last child.
+  // Throws KernelError (busy, not found).
   void remove(Group &group, Group &parent);
 
-  // The group's name in its parent's directory. Throws KernelError (not found).
+  // The group's name in its parent's directory.
   const std::string &nameOf(Group &group);
 
-  // The child groups. One that goes away meanwhile hides no other. Throws KernelError (not found).
+  // The child groups. One that is deleted meanwhile hides no other.
   std::vector<Child> children(const Group &group) const;
-
   bool hasChildren(const Group &group) const;
 
-  // Throws KernelError (not found) when the group was deleted.
   void requireAlive(const Group &group) const;
 
-  // Whether living processes are in the group or below it. Throws KernelError.
-  bool isPopulated(Group &group);
+  // Whether living processes are in the group or below it.
+  bool isPopulated(const Group &group) const;
 
-  // Makes this group and all above it pass the controllers on. Throws KernelError: busy, when
-  // processes are in one of them.
-  void passOn(Group &group);
+  // Moves a process into a group without child groups. Throws KernelError: not found (no such
+  // living process), bad parameter (a kernel thread).
+  void addMember(Group &group, int64_t pid);
 
-  // Ends that in a group that has no child groups, so that it takes processes. Throws nothing: the
-  // next process that joins it tries again.
-  void takeBack(Group &group) const noexcept;
-
-  // Opens a control file for writing, or gives the descriptor that is open already. Throws.
-  int open(Group &group, Control control);
-
-  // Writes it. Throws.
+  // Writes a control file. When another program has disabled its controller, enables it again.
+  // Throws KernelError.
   void write(Group &group, Control control, std::string_view text);
 
-  void forget(GroupId id) { groups_.erase(id); }
-
  private:
-  GroupPtr openKnown(const std::string &path);
-  GroupPtr makeIn(int parentDirectory, std::string_view name);
-  bool readPopulated(Group &group);
-  void passOnToHost() const;
-  static int keep(Group &group, Platform::UniqueFd file);
+  GroupPtr lookUpKnown(std::string_view path);
+  GroupPtr openChild(const Group *parent, std::string_view name);
+  GroupPtr makeIn(int directory, std::string_view name);
   GroupPtr adopt(Platform::UniqueFd directory, GroupId id);
   GroupPtr findUpwards(Platform::UniqueFd directory, GroupId id);
   GroupPtr findByWalking(GroupId id);
-  GroupId hostId();
+  GroupId requireHost();
   void takeHost(GroupId id);
-  void makeRoom();
+  void remember(std::string_view path, GroupId id);
+  void closeLeastUsed();
+  void enableControllersOfHost();
+  void enableControllersIn(Group &group);
+  void enableControllersBelow(Group &group);
+  void disableControllersBelow(const Group &group) const noexcept;
 
   Hierarchy hierarchy_;
   uint64_t mount_ = 0;

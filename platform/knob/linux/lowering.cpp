@@ -1,12 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
-// Linux kills at once when memory.max goes below what cannot be reclaimed; memory.high never kills.
-// So memory.high is lowered first, and memory.max follows only when the memory has come.
+// Linux kills at once when memory.max is set below what cannot be reclaimed; memory.high never
+// kills. So memory.high is lowered first, and memory.max follows only when the memory was given up.
 #include "knob/linux/lowering.h"
 
-#include <string>
-
 #include "knob/linux/control_values.h"
-#include "knob/linux/errno_status.h"
 
 namespace Knob::Linux {
 namespace {
@@ -16,94 +13,97 @@ std::string limitText(uint64_t limit) {
 }
 
 uint64_t readLimit(const Group &group, const char *name) {
-  return parseLimit(readControl(group.directory, name)).value_or(kUnlimited);
+  return parseLimit(readControl(group.fd(), name)).value_or(kUnlimited);
 }
 
 void writeHigh(const Group &group, uint64_t limit) {
-  const int error = writeControl(group.directory, kMemoryHighFile, limitText(limit));
+  const int error = writeControl(group.fd(), kMemoryHighFile, limitText(limit));
   if (error != 0) fail(error, std::string("cannot write ") + kMemoryHighFile);
 }
 
 [[noreturn]] void refuse(uint64_t usedBytes) {
   throw KernelError(Status::kMemoryBusy,
-                    "living processes hold " + std::to_string(usedBytes) + " bytes");
+                    "living processes use " + std::to_string(usedBytes) + " bytes");
 }
 
-// memory.high at the new maximum for as long as this lives. The record says so first: whoever comes
-// after a crash puts it back.
+// Keeps memory.high at the new maximum while this object lives. The record holds the former value
+// meanwhile, so that it can be restored after a crash.
 class LoweredHigh {
  public:
-  LoweredHigh(Group &group, const Held &held, uint64_t limit)
-      : group_(group), before_(held), saved_(readLimit(group, kMemoryHighFile)) {
+  LoweredHigh(Group &group, const StoredRecord &stored, uint64_t limit)
+      : group_(group), stored_(stored), saved_(readLimit(group, kMemoryHighFile)) {
     if (saved_ <= limit) return;
-    Record noted = held.record;
-    // An unrecorded minimum is counted nowhere, and must not look as if it were.
-    if (!held.isStored) noted.memory.allocation.min = 0;
+    Record noted = stored.record;
+    // No sum counts the minimum of a group without a record, and check() would expect it there.
+    if (!stored.isStored) noted.memory.allocation.min = 0;
     noted.savedHigh = saved_;
-    writeRecord(group_, noted, held.isStored ? Attribute::kAny : Attribute::kNew);
+    writeRecord(group.fd(), noted);
     isLowered_ = true;
     try {
-      writeHigh(group_, limit);
+      writeHigh(group, limit);
     } catch (const KernelError &) {
-      putBack();
+      restore();
       throw;
     }
   }
-  ~LoweredHigh() { putBack(); }
+  ~LoweredHigh() { restore(); }
   LoweredHigh(const LoweredHigh &) = delete;
   LoweredHigh &operator=(const LoweredHigh &) = delete;
 
  private:
-  void putBack() noexcept {
+  void restore() noexcept {
     if (!isLowered_) return;
     isLowered_ = false;
     try {
       writeHigh(group_, saved_);
-      if (before_.isStored) {
-        writeRecord(group_, before_.record);
+      if (stored_.isStored) {
+        writeRecord(group_.fd(), stored_.record);
       } else {
-        removeAttribute(group_.directory, kRecordAttribute);
+        removeAttribute(group_.fd(), kRecordAttribute);
       }
-    } catch (const KernelError &) {
-      // The record still says what belongs there; check() and the next change put it back.
+    } catch (const std::exception &) {
+      // The record still holds the former value; check() and the next change restore it.
     }
   }
 
   Group &group_;
-  const Held &before_;
+  const StoredRecord &stored_;
   const uint64_t saved_;
   bool isLowered_ = false;
 };
 
 void askToReclaim(const Group &group, uint64_t bytes) {
-  // It answers EAGAIN when not all could be had, and older kernels have no such file: what counts
-  // is what memory.current says afterwards.
-  (void)writeControl(group.directory, kMemoryReclaimFile, std::to_string(bytes));
+  // It fails with EAGAIN when not all could be reclaimed, and older kernels do not have this file.
+  // What counts is memory.current afterwards.
+  (void)writeControl(group.fd(), kMemoryReclaimFile, std::to_string(bytes));
 }
 
 }  // namespace
 
-void makeRoomBelow(Groups &groups, Group &group, const Held &held, int64_t maxMB, Writes &writes) {
-  if (!groups.isPopulated(group)) return;
-  const std::string before = readControl(group.directory, rowOf(Control::kMemoryMax).name);
-  const std::string after = memoryText(maxMB);
+bool isLowerLimit(const std::string &before, const std::string &after) {
+  return parseLimit(after).value_or(kUnlimited) < parseLimit(before).value_or(kUnlimited);
+}
+
+void lowerMemoryMax(CgroupTree &tree, Group &group, const StoredRecord &stored,
+                    const std::string &before, const std::string &after, UndoableWrites &writes) {
+  if (!tree.isPopulated(group)) return writes.write(group, Control::kMemoryMax, before, after);
   const uint64_t limit = parseLimit(after).value_or(kUnlimited);
   uint64_t used = readLimit(group, kMemoryCurrentFile);
-  // Whatever lives needs some: what can only fail need not push everything out of memory first.
+  // No process can live without memory, so all reclaim would be in vain.
   if (limit == 0) refuse(used);
-  const LoweredHigh lowered(group, held, limit);
+  const LoweredHigh lowered(group, stored, limit);
   if (used > limit) {
     askToReclaim(group, used - limit);
     used = readLimit(group, kMemoryCurrentFile);
     if (used > limit) refuse(used);
   }
-  writes.control(group, Control::kMemoryMax, before, after);
+  writes.write(group, Control::kMemoryMax, before, after);
 }
 
 void restoreMemoryHigh(Group &group, Record &record) {
   writeHigh(group, *record.savedHigh);
   record.savedHigh.reset();
-  writeRecord(group, record);
+  writeRecord(group.fd(), record);
 }
 
 }  // namespace Knob::Linux

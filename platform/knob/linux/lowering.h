@@ -1,19 +1,26 @@
 // SPDX-License-Identifier: Apache-2.0
-// Taking memory from a group that lives, without killing what lives in it.
+// Lowering memory.max of a group without killing the processes in it.
 #pragma once
 
-#include "knob/linux/allocations.h"
+#include <string>
+
 #include "knob/linux/cgroup_tree.h"
+#include "knob/linux/record.h"
 #include "knob/linux/undoable_writes.h"
 
 namespace Knob::Linux {
 
-// Comes before memory.max is lowered. Without living processes there is nothing to do; with them it
-// is lowered here, and only when what they hold, after the kernel was asked to reclaim, fits.
-// Throws KernelError: memory busy, and nothing has changed.
-void makeRoomBelow(Groups &groups, Group &group, const Held &held, int64_t maxMB, Writes &writes);
+// Whether the second text of memory.max is a lower limit than the first.
+bool isLowerLimit(const std::string &before, const std::string &after);
 
-// Puts memory.high back where a process died that had lowered it, and takes that from the record.
+// Writes a lower memory.max. Where processes live in the group or below it, asks the kernel to
+// reclaim first, and writes only when what they use fits. before: the file's text now. Throws
+// KernelError: memory busy, and nothing has changed.
+void lowerMemoryMax(CgroupTree &tree, Group &group, const StoredRecord &stored,
+                    const std::string &before, const std::string &after, UndoableWrites &writes);
+
+// Restores memory.high after the process died that had lowered it, and removes the note from the
+// record. Throws KernelError.
 void restoreMemoryHigh(Group &group, Record &record);
 
 }  // namespace Knob::Linux

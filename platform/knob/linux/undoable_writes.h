@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The writes of one operation, in order, each remembered with what was there before: an operation
-// that fails half-way puts everything back, newest first.
+// The writes of one operation, each with what was there before. Unless they are committed, the
+// destructor restores everything, newest first.
 #pragma once
 
 #include <functional>
@@ -12,26 +12,22 @@
 
 namespace Knob::Linux {
 
-class Writes {
+class UndoableWrites {
  public:
-  explicit Writes(Groups &groups) : groups_(groups) {}
-  ~Writes();
-  Writes(const Writes &) = delete;
-  Writes &operator=(const Writes &) = delete;
+  explicit UndoableWrites(CgroupTree &tree) : tree_(tree) {}
+  ~UndoableWrites();
+  UndoableWrites(const UndoableWrites &) = delete;
+  UndoableWrites &operator=(const UndoableWrites &) = delete;
 
-  // before: absent where there was none. Throw KernelError (exists, when there is one after all).
-  void record(Group &group, const Record *before, const Record &after);
-  void control(Group &group, Control control, const std::string &before, const std::string &after);
+  // Write unless before and after are equal. The group outlives this object. Throw KernelError.
+  void write(Group &group, const StoredRecord &before, const Record &after);
+  void write(Group &group, Control control, const std::string &before, const std::string &after);
 
-  // What was written stays.
   void commit() { undo_.clear(); }
 
  private:
-  Groups &groups_;
+  CgroupTree &tree_;
   std::vector<std::function<void()>> undo_;
 };
-
-// Writes a group's record. Throws KernelError; for kNew: exists, when it has one already.
-void writeRecord(Group &group, const Record &record, Attribute kind = Attribute::kAny);
 
 }  // namespace Knob::Linux
