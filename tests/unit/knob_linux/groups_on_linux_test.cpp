@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <linux/capability.h>
+#include <sys/file.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -13,6 +14,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <csignal>
 #include <filesystem>
 #include <fstream>
@@ -21,9 +23,11 @@
 #include <system_error>
 
 #include "interrupted_calls.h"
+#include "knob/linux/cgroup_tree.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/linux_kernel.h"
 #include "knob/linux/record.h"
+#include "knob/linux/tree_lock.h"
 #include "knob/signature.h"
 #include "knob/status.h"
 
@@ -390,6 +394,64 @@ TEST_F(OnLinux, AnOrdinaryUserCannotMakeTheFirstGroup) {
     EXPECT_EQ(statusOfCall([&] { open()->lookUp("host"); }, &text), Status::kKernelNotUsable);
     EXPECT_THAT(text, HasSubstr("run as root, or set cgroup-root"));
   });
+}
+
+// Locks every file of a group that an ordinary user can open, until the end of the test.
+class HostileUser {
+ public:
+  explicit HostileUser(const path &group) {
+    int ready[2];
+    if (::pipe(ready) != 0 || (pid_ = ::fork()) < 0) throw std::runtime_error("no process");
+    if (pid_ == 0) {
+      if (::setuid(12345) != 0) ::_exit(1);
+      lock(kMount / group);
+      for (const auto &entry : std::filesystem::directory_iterator(kMount / group)) {
+        if (entry.is_regular_file()) lock(entry.path());
+      }
+      if (::write(ready[1], "x", 1) != 1) ::_exit(1);
+      for (;;) ::pause();
+    }
+    ::close(ready[1]);
+    char byte = 0;
+    if (::read(ready[0], &byte, 1) != 1) throw std::runtime_error("no process");
+    ::close(ready[0]);
+  }
+  ~HostileUser() {
+    ::kill(pid_, SIGKILL);
+    ::waitpid(pid_, nullptr, 0);
+  }
+  HostileUser(const HostileUser &) = delete;
+  HostileUser &operator=(const HostileUser &) = delete;
+
+ private:
+  static void lock(const path &file) {
+    for (const int mode : {O_RDONLY, O_WRONLY}) {
+      const int descriptor = ::open(file.c_str(), mode);
+      if (descriptor >= 0) (void)::flock(descriptor, LOCK_EX | LOCK_NB);
+    }
+  }
+
+  pid_t pid_ = -1;
+};
+
+TEST_F(OnLinux, NoLockOfAnOrdinaryUserStopsAnOperation) {
+  const GroupId id = create("host/opt", "pool");
+  const HostileUser user("host");
+  const auto begin = std::chrono::steady_clock::now();
+  setMemory(id, 10, 100);
+  EXPECT_EQ(kernel_->view(id).memory.min, 10);
+  kernel_->remove(id);
+  EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(5));
+}
+
+TEST_F(OnLinux, ALockOfRootIsRefusedAtTheDeadlineWithItsHolder) {
+  const GroupId id = create("host/opt", "pool");
+  const GroupPtr host = CgroupTree(openHierarchy(configuration_)).host();
+  const TreeLock lock(host->fd(), TreeLock::Kind::kExclusive);
+  std::string text;
+  EXPECT_EQ(statusOfCall([&] { setMemory(id, 10, 100); }, &text), Status::kFailure);
+  EXPECT_EQ(text, "the groups have been locked by process " + std::to_string(::getpid()) +
+                      " (groups_on_linux) for 20 s");
 }
 
 class Elsewhere : public OnLinux {
