@@ -33,6 +33,12 @@ int64_t machineCapacity(const HostFacts &facts, Resource resource) {
   return static_cast<int64_t>(facts.memoryKB / 1024);
 }
 
+void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted) {
+  if (wanted.max == 0 && state.childrenSum > 0) {
+    throw KernelError(Status::kBusy, "child groups have reservations");
+  }
+}
+
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
                                                 const Allocation &wanted, int64_t capacity) {
   int64_t before = reservationOf(states.front());

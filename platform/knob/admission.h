@@ -28,6 +28,10 @@ int64_t changedSum(int64_t sum, int64_t before, int64_t after);
 // How much can be reserved in all: MB of physical memory, or 100 percent for each CPU.
 int64_t machineCapacity(const HostFacts &facts, Resource resource);
 
+// Throws KernelError, busy, for a maximum of 0 while child groups have reservations. The caller
+// disables the group, and can wait until they are deleted; a refusal would be final.
+void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted);
+
 // states: the group first, then every group above it, up to the root. Gives the states as they are
 // once the group has the wanted allocation, or nothing when that does not fit. The states beyond
 // the last one that changes are left out.

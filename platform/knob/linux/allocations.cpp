@@ -46,6 +46,7 @@ void AllocationManager::change(Group &group, Resource resource, const Allocation
   const Allocation wanted = changedAllocation(current, change);
   if (stored.record.savedHigh) restoreMemoryHigh(group, stored.record);
   if (areEqual(wanted, current)) return;
+  requireNoneReservedBelow(stored.record.state(resource), wanted);
   if (resource == Resource::kCpu && countForeignMinimum(group, stored)) {
     stored = readToChange(group);
   }

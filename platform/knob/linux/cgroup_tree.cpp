@@ -247,18 +247,24 @@ GroupPtr CgroupTree::makeHost() {
   return host();
 }
 
+// The controllers are enabled first: a process that is killed in between must not leave a group
+// that has none.
 GroupPtr CgroupTree::make(Group &parent, std::string_view name) {
-  GroupPtr group = makeIn(parent.fd(), name);
-  group->parent = parent.id;
-  if (hasControllers(*group)) return group;
+  if (!hasChildren(parent)) enableControllersBelow(parent);
+  GroupPtr group;
   try {
-    enableControllersBelow(parent);
+    group = makeIn(parent.fd(), name);
+    group->parent = parent.id;
+    // Another program may have disabled them.
+    if (!hasControllers(*group)) enableControllersBelow(parent);
+    return group;
   } catch (const KernelError &) {
-    (void)::unlinkat(parent.fd(), group->name.c_str(), AT_REMOVEDIR);  // the first error counts
-    groups_.erase(group->id);
+    // The first error counts.
+    if (group) (void)::unlinkat(parent.fd(), group->name.c_str(), AT_REMOVEDIR);
+    if (group) groups_.erase(group->id);
+    disableControllersBelow(parent);
     throw;
   }
-  return group;
 }
 
 GroupPtr CgroupTree::makeIn(int parent, std::string_view name) {

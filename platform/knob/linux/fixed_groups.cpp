@@ -52,6 +52,11 @@ bool isUntouched(CgroupTree &tree, const Group &host) {
 
 }  // namespace
 
+bool isFixedGroup(CgroupTree &tree, Group &group) {
+  const GroupPtr parent = tree.parentOf(group);
+  return !parent || (!tree.parentOf(*parent) && tree.nameOf(group) == kFixedChildName);
+}
+
 void makeFixedGroups(CgroupTree &tree) {
   try {
     const GroupPtr host = makeIfMissing(tree, nullptr, std::string(kRootName));

@@ -18,6 +18,9 @@ inline constexpr const char *kLibraryAttribute = "user.knob.library";
 inline constexpr const char *kHowToGetRights =
     "; run as root, or set cgroup-root in knob.conf to a group that you own";
 
+// Whether a group is host or host/opt. Throws KernelError.
+bool isFixedGroup(CgroupTree &tree, Group &group);
+
 // Makes those of the two that do not exist. Throws KernelError: kernel not usable, with the reason
 // and what to do.
 void makeFixedGroups(CgroupTree &tree);

@@ -14,6 +14,7 @@
 #include "knob/linux/control_values.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/hierarchy.h"
+#include "knob/linux/lowering.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/machine_facts.h"
 #include "knob/names.h"
@@ -64,9 +65,8 @@ class LinuxKernel final : public Kernel {
     if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "not a name for a group");
     const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
     const GroupPtr above = find(parent);
-    const GroupPtr group = tree_.make(*above, name);
+    const GroupPtr group = make(above, name);
     try {
-      requireAnyMemory(above);
       writeRecord(group->fd(), Record());
     } catch (const KernelError &) {
       removeQuietly(*group, *above);
@@ -76,14 +76,12 @@ class LinuxKernel final : public Kernel {
   }
 
   void remove(GroupId id) override {
-    const GroupPtr top = host();
-    const TreeLock lock(top->fd(), TreeLock::Kind::kExclusive);
+    const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
     const GroupPtr group = find(id);
-    const GroupPtr parent = tree_.parentOf(*group);
-    if (!parent || (parent->id == top->id && tree_.nameOf(*group) == kFixedChildName)) {
+    if (isFixedGroup(tree_, *group)) {
       throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be deleted");
     }
-    allocations_.remove(*group, *parent);
+    allocations_.remove(*group, *tree_.parentOf(*group));
   }
 
   Allocation readAllocation(GroupId id, Resource resource) override {
@@ -92,7 +90,11 @@ class LinuxKernel final : public Kernel {
 
   void setAllocation(GroupId id, Resource resource, const AllocationChange &change) override {
     const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
-    allocations_.change(*find(id), resource, change);
+    const GroupPtr group = find(id);
+    if (resource == Resource::kMemory && change.max == 0 && isFixedGroup(tree_, *group)) {
+      throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be disabled");
+    }
+    allocations_.change(*group, resource, change);
   }
 
   std::vector<GroupId> childGroups(GroupId id) override {
@@ -141,6 +143,16 @@ class LinuxKernel final : public Kernel {
     GroupPtr group = tree_.find(id);
     tree_.requireAlive(*group);
     return group;
+  }
+
+  GroupPtr make(const GroupPtr &parent, std::string_view name) {
+    try {
+      return tree_.make(*parent, name);
+    } catch (const KernelError &error) {
+      if (error.status != Status::kOutOfMemory) throw;
+    }
+    const LiftedMaximum lifted(tree_, parent);
+    return tree_.make(*parent, name);
   }
 
   // The group itself and all above it have a memory maximum other than 0.

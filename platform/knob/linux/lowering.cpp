@@ -100,6 +100,30 @@ void lowerMemoryMax(CgroupTree &tree, Group &group, const StoredRecord &stored,
   writes.write(group, Control::kMemoryMax, before, after);
 }
 
+LiftedMaximum::LiftedMaximum(CgroupTree &tree, GroupPtr group) : tree_(tree) {
+  const char *name = infoOf(Control::kMemoryMax).name;
+  std::vector<GroupPtr> zero;
+  for (; group; group = tree.parentOf(*group)) {
+    if (readControlIfAny(group->fd(), name) != "0") continue;
+    if (tree.isPopulated(*group)) {
+      throw KernelError(Status::kOutOfMemory, "the memory maximum of " + tree.nameOf(*group) +
+                                                  " is 0, and processes are in it");
+    }
+    zero.push_back(group);
+  }
+  for (const GroupPtr &each : zero) {
+    lifted_.push_back(each);
+    tree.write(*each, Control::kMemoryMax, "max");
+  }
+}
+
+// Without a process in them, Linux writes the maximum without killing.
+LiftedMaximum::~LiftedMaximum() {
+  for (const GroupPtr &group : lifted_) {
+    (void)writeControl(group->fd(), infoOf(Control::kMemoryMax).name, "0");
+  }
+}
+
 void restoreMemoryHigh(Group &group, Record &record) {
   writeHigh(group, *record.savedHigh);
   record.savedHigh.reset();
