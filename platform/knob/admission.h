@@ -32,9 +32,9 @@ int64_t machineCapacity(const HostFacts &facts, Resource resource);
 // disables the group, and can wait until they are deleted; a refusal would be final.
 void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted);
 
-// states: the group first, then every group above it, up to the root. Gives the states as they are
-// once the group has the wanted allocation, or nothing when that does not fit. The states beyond
-// the last one that changes are left out.
+// states: of the group first, then of every group above it, up to the root. Returns the states
+// after the group has the wanted allocation, up to the last one that changes; nothing when the
+// allocation does not fit.
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
                                                 const Allocation &wanted, int64_t capacity);
 
