@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The sub-commands and the option mode. Each parses its own options with getopt and returns the exit
-// status of the process. They throw exceptions of the standard family, which the entry point reports
-// with status 1.
+// The sub-commands and the option mode. Each parses its own options with getopt and returns the
+// exit status of the process. They throw exceptions of the standard family, which the entry point
+// reports with status 1.
 #pragma once
 
 // argv[0] is the sub-command's name. 0: success, 1: failure or usage error.
