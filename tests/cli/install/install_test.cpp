@@ -268,9 +268,10 @@ TEST_F(Install, FileLargerThan64MBIsRefused) {
 
 TEST_F(Install, MoreFilesThanAProcessMayHaveOpenAreInstalled) {
   Arguments paths{"64", "poolctl-install"};
-  for (int i = 0; i < 100; ++i)
-    paths.push_back(source("f" + std::to_string(i) + ".yaml",
-                           "- name: p" + std::to_string(i) + "\n  memMin: 1\n"));
+  for (int i = 0; i < 100; ++i) {
+    const std::string number = std::to_string(i);
+    paths.push_back(source("f" + number + ".yaml", "- name: p" + number + "\n  memMin: 1\n"));
+  }
   (void)world.etc();
   const auto limited = [&](const Arguments &arguments) {
     Arguments all{"-c", "ulimit -n $0; exec \"$@\""};
