@@ -21,7 +21,7 @@ struct Command {
 // Adds every row of TABLE to APP. Parsing one sets *ACTION, which must live as long as APP.
 template <typename Table>
 void addCommands(CLI::App &app, const Table &table, Action *action) {
-  app.require_subcommand(0, 1);  // runTool() reports that there is none
+  app.require_subcommand(0, 1);  // runTool() reports a missing one
   for (const auto &row : table) addCommand(app, row, action);
 }
 
