@@ -21,7 +21,7 @@ namespace {
 
 constexpr const char *kDefaultFile = "/etc/kestrel.conf";
 constexpr const char *kRootStore = "/var/lib/kestrel/store.db";
-constexpr int64_t kMostTimeoutMs = 3600000;  // an hour
+constexpr int64_t kMaxTimeoutMs = 3600000;  // an hour
 const std::initializer_list<std::string_view> kKeys = {
     "store", "path", "endpoints", "prefix",        "cacert",
     "cert",  "key",  "user",      "password-file", "timeout-ms"};
@@ -107,7 +107,7 @@ void readKeys(const Platform::KeyValueFile &file, Configuration *result) {
   const auto store = file.oneOf("store", {"sqlite", "etcd"});
   result->engine = store == "etcd" ? Engine::kEtcd : Engine::kSqlite;
   result->path = file.absolutePath("path").value_or("");
-  if (const auto timeout = file.integer("timeout-ms", 1, kMostTimeoutMs)) {
+  if (const auto timeout = file.integer("timeout-ms", 1, kMaxTimeoutMs)) {
     result->timeout = std::chrono::milliseconds(*timeout);
   }
   readEtcd(file, result);

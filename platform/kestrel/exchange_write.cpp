@@ -105,9 +105,9 @@ std::string writtenValue(const Value &value) {
 
 // "name: value"; YAML wants a mark before a key that is longer than it looks ahead for a colon.
 std::string writtenField(const std::string &name, const Value &value) {
-  constexpr size_t kLongestSimpleKey = 1000;
+  constexpr size_t kMaxSimpleKey = 1000;
   const std::string key = writtenName(name);
-  if (key.size() <= kLongestSimpleKey) return "    " + key + ": " + writtenValue(value) + "\n";
+  if (key.size() <= kMaxSimpleKey) return "    " + key + ": " + writtenValue(value) + "\n";
   return "    ? " + key + "\n    : " + writtenValue(value) + "\n";
 }
 

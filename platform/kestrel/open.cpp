@@ -41,7 +41,7 @@ std::string milliseconds(std::chrono::steady_clock::duration time) {
 }
 
 // A lookup of an id that no object has: what it costs to be answered.
-std::string timeOfAnAnswer(Backend &backend) {
+std::string responseTime(Backend &backend) {
   const auto start = std::chrono::steady_clock::now();
   (void)backend.read(ObjectId{});
   return milliseconds(std::chrono::steady_clock::now() - start);
@@ -57,7 +57,7 @@ Condition look(Report *report) {
     return Condition::kMissing;
   }
   for (const Detail &detail : backend->details()) report->details.push_back(detail);
-  report->details.emplace_back("answers in", timeOfAnAnswer(*backend));
+  report->details.emplace_back("answers in", responseTime(*backend));
   return Condition::kUsable;
 }
 

@@ -28,7 +28,7 @@ namespace fs = std::filesystem;
 
 namespace {
 
-constexpr std::chrono::seconds kMostStart{60};
+constexpr std::chrono::seconds kMaxStart{60};
 constexpr std::chrono::milliseconds kStep{10};
 
 // A cluster must not change its leader because two CPUs have too much to do for a moment; a single
@@ -162,12 +162,12 @@ std::vector<std::string> Etcd::urls() const {
 void Etcd::awaitReady(size_t index) {
   constexpr long kBadRequest = 400;
   Kestrel::Etcd::HttpClient client{Kestrel::Configuration()};
-  const auto end = std::chrono::steady_clock::now() + kMostStart;
+  const auto end = std::chrono::steady_clock::now() + kMaxStart;
   while (std::chrono::steady_clock::now() < end) {
-    const auto answer =
+    const auto response =
         client.post(member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
                     {std::chrono::seconds(5), std::chrono::seconds(5)}, size_t{1} << 16);
-    if (answer.status == 200 || answer.status == kBadRequest) return;
+    if (response.status == 200 || response.status == kBadRequest) return;
     std::this_thread::sleep_for(kStep);
   }
   throw std::runtime_error("etcd does not become ready:\n" + member(index).log());

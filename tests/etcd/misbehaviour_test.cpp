@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Members that are slow, that answer garbage, that say one thing and then another: what a run makes
-// of them, and how long it takes.
+// Members that are slow, that send garbage, that contradict themselves: what a run makes of them,
+// and how long it takes.
 #include <gmock/gmock.h>
 
 #include "etcd_world.h"
@@ -16,9 +16,9 @@ using testing::HasSubstr;
 const std::string kKey = "/kestrel/global/c/g/a";
 const std::string kValue = R"({"n":1})";
 
-std::string refusalAnswer(int status, int code, const std::string &message) {
-  return httpAnswer(status, R"({"error":")" + message + R"(","message":")" + message +
-                                R"(","code":)" + std::to_string(code) + "}");
+std::string refusalResponse(int status, int code, const std::string &message) {
+  return httpResponse(status, R"({"error":")" + message + R"(","message":")" + message +
+                                  R"(","code":)" + std::to_string(code) + "}");
 }
 
 class EtcdMisbehaviour : public testing::Test {
@@ -69,40 +69,40 @@ TEST_F(EtcdMisbehaviour, LookupsAreSerializableAndAfterTheFirstOfItsRevision) {
 }
 
 TEST_F(EtcdMisbehaviour, GarbageIsAFailureOfTheMemberAndTheNextOneIsAsked) {
-  const std::string answers[] = {
+  const std::string responses[] = {
       "garbage without a head\r\n\r\n",
       "HTTP/1.1 200 OK\r\nConnection: close\r\nContent-Length: 100\r\n\r\nshort",
-      httpAnswer(200, ""),
-      httpAnswer(200, "<html>"),
-      httpAnswer(200, "[]"),
-      httpAnswer(200, "{}"),
-      httpAnswer(200, R"({"header":7})"),
-      httpAnswer(200, R"({"header":{}})"),
-      httpAnswer(200, R"({"header":{"revision":"0"}})"),
-      httpAnswer(200, R"({"header":{"revision":"-3"}})"),
-      httpAnswer(200, R"({"header":{"revision":"x"}})"),
-      httpAnswer(200, R"({"header":{"revision":"99999999999999999999"}})"),
-      httpAnswer(200, R"({"header":{"revision":"7"},"kvs":7})"),
-      httpAnswer(200, R"({"header":{"revision":"7"},"kvs":[7]})"),
-      httpAnswer(200, R"({"header":{"revision":"7"},"kvs":[{"key":"!"}]})"),
-      httpAnswer(200, R"({"header":{"revision":"7"},"more":"yes"})"),
-      httpAnswer(200, std::string(100000, '[')),
+      httpResponse(200, ""),
+      httpResponse(200, "<html>"),
+      httpResponse(200, "[]"),
+      httpResponse(200, "{}"),
+      httpResponse(200, R"({"header":7})"),
+      httpResponse(200, R"({"header":{}})"),
+      httpResponse(200, R"({"header":{"revision":"0"}})"),
+      httpResponse(200, R"({"header":{"revision":"-3"}})"),
+      httpResponse(200, R"({"header":{"revision":"x"}})"),
+      httpResponse(200, R"({"header":{"revision":"99999999999999999999"}})"),
+      httpResponse(200, R"({"header":{"revision":"7"},"kvs":7})"),
+      httpResponse(200, R"({"header":{"revision":"7"},"kvs":[7]})"),
+      httpResponse(200, R"({"header":{"revision":"7"},"kvs":[{"key":"!"}]})"),
+      httpResponse(200, R"({"header":{"revision":"7"},"more":"yes"})"),
+      httpResponse(200, std::string(100000, '[')),
       rangeOf("/kestrel/global/c/g/b", kValue),
-      httpAnswer(404, "404 page not found"),
-      httpAnswer(500, "{}"),
-      httpAnswer(502, "Bad gateway"),
-      httpAnswer(302, ""),
-      refusalAnswer(503, 14, "etcdserver: request timed out"),
-      refusalAnswer(501, 12, "Not Implemented"),
+      httpResponse(404, "404 page not found"),
+      httpResponse(500, "{}"),
+      httpResponse(502, "Bad gateway"),
+      httpResponse(302, ""),
+      refusalResponse(503, 14, "etcdserver: request timed out"),
+      refusalResponse(501, 12, "Not Implemented"),
       "",
   };
-  for (const std::string &answer : answers) {
-    const FakeServer bad([&](const FakeRequest &) { return answer; });
+  for (const std::string &response : responses) {
+    const FakeServer bad([&](const FakeRequest &) { return response; });
     const auto run = store({&bad, &good_});
-    EXPECT_EQ(run->read(a_), one_) << answer.substr(0, 200);
+    EXPECT_EQ(run->read(a_), one_) << response.substr(0, 200);
     const int asked = bad.requests();
     EXPECT_EQ(run->read(a_), one_);
-    EXPECT_EQ(bad.requests(), asked) << "asked again after: " << answer.substr(0, 200);
+    EXPECT_EQ(bad.requests(), asked) << "asked again after: " << response.substr(0, 200);
   }
 }
 
@@ -125,7 +125,7 @@ TEST_F(EtcdMisbehaviour, ARedirectIsNotFollowed) {
 }
 
 TEST_F(EtcdMisbehaviour, AProxyOfTheEnvironmentIsNotUsed) {
-  const FakeServer proxy([](const FakeRequest &) { return httpAnswer(200, "{}"); });
+  const FakeServer proxy([](const FakeRequest &) { return httpResponse(200, "{}"); });
   for (const char *name : {"http_proxy", "all_proxy", "ALL_PROXY"}) {
     setenv(name, proxy.url().c_str(), 1);
   }
@@ -174,9 +174,9 @@ TEST_F(EtcdMisbehaviour, AnAnswerThatDripsIsNotWaitedForBeyondTheTime) {
 }
 
 TEST_F(EtcdMisbehaviour, AMemberOfAnotherClusterIsNotBelieved) {
-  int answers = 0;
+  int responses = 0;
   const FakeServer first([&](const FakeRequest &) {
-    return ++answers == 1 ? rangeOf(kKey, kValue, "7", "1") : std::string();
+    return ++responses == 1 ? rangeOf(kKey, kValue, "7", "1") : std::string();
   });
   const FakeServer strange(
       [](const FakeRequest &) { return rangeOf(kKey, R"({"n":2})", "7", "2"); });
@@ -187,21 +187,21 @@ TEST_F(EtcdMisbehaviour, AMemberOfAnotherClusterIsNotBelieved) {
 
 TEST_F(EtcdMisbehaviour, AMemberThatLagsBehindTheRunIsGivenAMoment) {
   const std::string behind =
-      refusalAnswer(400, 11, "etcdserver: mvcc: required revision is a future revision");
-  int answers = 0;
+      refusalResponse(400, 11, "etcdserver: mvcc: required revision is a future revision");
+  int responses = 0;
   const FakeServer server([&](const FakeRequest &) {
-    ++answers;
-    return answers == 2 || answers == 3 ? behind : rangeOf(kKey, kValue);
+    ++responses;
+    return responses == 2 || responses == 3 ? behind : rangeOf(kKey, kValue);
   });
   const auto run = store({&server});
   EXPECT_EQ(run->read(a_), one_);
   EXPECT_EQ(run->read(a_), one_);
-  EXPECT_EQ(answers, 4);
+  EXPECT_EQ(responses, 4);
 }
 
 TEST_F(EtcdMisbehaviour, AMemberThatNeverCatchesUpIsPassedOver) {
   const FakeServer server([&](const FakeRequest &) {
-    return refusalAnswer(400, 11, "etcdserver: mvcc: required revision is a future revision");
+    return refusalResponse(400, 11, "etcdserver: mvcc: required revision is a future revision");
   });
   EXPECT_EQ(store({&server, &good_}, milliseconds(500))->read(a_), one_);
   EXPECT_LE(server.requests(), 101);
@@ -209,17 +209,19 @@ TEST_F(EtcdMisbehaviour, AMemberThatNeverCatchesUpIsPassedOver) {
 
 TEST_F(EtcdMisbehaviour, AClientCertificateThatAServerWithUsersCannotTakeIsNamedAsTheReason) {
   const FakeServer server([](const FakeRequest &) {
-    return httpAnswer(400,
-                      "CommonName of client sending a request against gateway will be ignored and "
-                      "not used as expected\n");
+    return httpResponse(
+        400,
+        "CommonName of client sending a request against gateway will be ignored and "
+        "not used as expected\n");
   });
   EXPECT_THAT(refusalOf([&] { store({&server})->read(a_); }),
               HasSubstr("no client certificate with a common name"));
 }
 
 TEST_F(EtcdMisbehaviour, ARefusalIsNoReasonToAskTheNextMember) {
-  const FakeServer server(
-      [&](const FakeRequest &) { return refusalAnswer(403, 7, "etcdserver: permission denied"); });
+  const FakeServer server([&](const FakeRequest &) {
+    return refusalResponse(403, 7, "etcdserver: permission denied");
+  });
   const auto run = store({&server, &good_});
   for (int i = 0; i < 2; ++i) {
     const std::string why = refusalOf([&] { run->read(a_); });
@@ -244,7 +246,7 @@ TEST_F(EtcdMisbehaviour, AMemberThatHasGotAChangeHasAllTheTimeThereIs) {
   FakeServer *self = nullptr;
   FakeServer slow([&](const FakeRequest &) {
     self->wait(milliseconds(600));
-    return httpAnswer(200, R"({"header":{"cluster_id":"1","revision":"8"},"deleted":"1"})");
+    return httpResponse(200, R"({"header":{"cluster_id":"1","revision":"8"},"deleted":"1"})");
   });
   self = &slow;
   EXPECT_TRUE(store({&slow, &good_, &good_}, milliseconds(1500))->removeObject(a_));
@@ -253,7 +255,7 @@ TEST_F(EtcdMisbehaviour, AMemberThatHasGotAChangeHasAllTheTimeThereIs) {
 TEST_F(EtcdMisbehaviour, AChangeThatNeverReachedAMemberGoesToTheNext) {
   const FakeServer server([](const FakeRequest &request) {
     return request.path == "/v3/kv/deleterange"
-               ? httpAnswer(200, R"({"header":{"cluster_id":"1","revision":"8"},"deleted":"1"})")
+               ? httpResponse(200, R"({"header":{"cluster_id":"1","revision":"8"},"deleted":"1"})")
                : std::string();
   });
   auto settings = configuration({&server});
@@ -265,7 +267,7 @@ TEST_F(EtcdMisbehaviour, AWriterThatIsAlwaysOvertakenGivesUpAndSaysSo) {
   const std::string overtaken = R"({"header":{"cluster_id":"1","revision":"8"},"responses":[)"
                                 R"({"response_range":{"header":{"revision":"8"}}}]})";
   const FakeServer server([&](const FakeRequest &request) {
-    return request.path == "/v3/kv/txn" ? httpAnswer(200, overtaken) : rangeOf(kKey, kValue);
+    return request.path == "/v3/kv/txn" ? httpResponse(200, overtaken) : rangeOf(kKey, kValue);
   });
   const auto time = timeOf([&] {
     EXPECT_THAT(refusalOf([&] { store({&server})->setField(a_, "n", int64_t{2}); }),
@@ -283,10 +285,11 @@ TEST_F(EtcdMisbehaviour, ATokenIsAskedForOnceAndRenewedOnce) {
   const FakeServer server([&](const FakeRequest &request) {
     if (request.path == "/v3/auth/authenticate") {
       seen.push_back(request.body);
-      return httpAnswer(200, R"({"header":{},"token":"t)" + std::to_string(seen.size()) + "\"}");
+      return httpResponse(200, R"({"header":{},"token":"t)" + std::to_string(seen.size()) + "\"}");
     }
     const bool known = request.head.find("Authorization: t2") != std::string::npos;
-    return known ? rangeOf(kKey, kValue) : refusalAnswer(401, 16, "etcdserver: invalid auth token");
+    return known ? rangeOf(kKey, kValue)
+                 : refusalResponse(401, 16, "etcdserver: invalid auth token");
   });
   auto settings = configuration({&server});
   settings.user = "u";
@@ -302,8 +305,8 @@ TEST_F(EtcdMisbehaviour, AServerThatTakesNoTokenIsAskedTwiceAndNeverAgain) {
   writeFile(folder.path() / "password", "p");
   std::filesystem::permissions(folder.path() / "password", std::filesystem::perms(0600));
   const FakeServer server([&](const FakeRequest &request) {
-    if (request.path == "/v3/auth/authenticate") return httpAnswer(200, R"({"token":"t"})");
-    return refusalAnswer(401, 16, "etcdserver: invalid auth token");
+    if (request.path == "/v3/auth/authenticate") return httpResponse(200, R"({"token":"t"})");
+    return refusalResponse(401, 16, "etcdserver: invalid auth token");
   });
   auto settings = configuration({&server});
   settings.user = "u";
@@ -316,11 +319,11 @@ TEST_F(EtcdMisbehaviour, AServerThatTakesNoTokenIsAskedTwiceAndNeverAgain) {
 }
 
 TEST_F(EtcdMisbehaviour, StatusOfAServerThatIsNoEtcdSaysSo) {
-  const FakeServer html([](const FakeRequest &) { return httpAnswer(200, "<html>"); });
-  const FakeServer missing([](const FakeRequest &) { return httpAnswer(404, "not found"); });
+  const FakeServer html([](const FakeRequest &) { return httpResponse(200, "<html>"); });
+  const FakeServer missing([](const FakeRequest &) { return httpResponse(404, "not found"); });
   const auto details = store({&html, &missing})->details();
   ASSERT_EQ(details.size(), 3U);
-  EXPECT_THAT(details[1].second, HasSubstr("the answer is not etcd's: not JSON"));
+  EXPECT_THAT(details[1].second, HasSubstr("the response is not etcd's: not JSON"));
   EXPECT_THAT(details[2].second, HasSubstr("HTTP status 404"));
 }
 

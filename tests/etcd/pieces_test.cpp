@@ -166,18 +166,18 @@ TEST(Protocol, ZeroAndEmptyAreLeftOut) {
   EXPECT_EQ(rangeText({"k", "", 0, false, 0}), R"({"key":"aw=="})");
   EXPECT_EQ(rangeText({"k", "l", 5, true, 9}),
             R"({"key":"aw==","range_end":"bA==","limit":"5","revision":"9","serializable":true})");
-  const RangeAnswer answer = readRange(R"({"header":{"revision":"3"}})");
-  EXPECT_EQ(answer.header.revision, 3);
-  EXPECT_TRUE(answer.found.empty());
-  EXPECT_FALSE(answer.more);
+  const RangeResponse response = readRange(R"({"header":{"revision":"3"}})");
+  EXPECT_EQ(response.header.revision, 3);
+  EXPECT_TRUE(response.found.empty());
+  EXPECT_FALSE(response.more);
 }
 
 TEST(Protocol, AKeyWithoutAValueHasAnEmptyOne) {
-  const auto answer = readRange(R"({"header":{},"kvs":[{"key":"aw==","mod_revision":"4"}]})");
-  ASSERT_EQ(answer.found.size(), 1U);
-  EXPECT_EQ(answer.found[0].key, "k");
-  EXPECT_EQ(answer.found[0].value, "");
-  EXPECT_EQ(answer.found[0].modRevision, 4);
+  const auto response = readRange(R"({"header":{},"kvs":[{"key":"aw==","mod_revision":"4"}]})");
+  ASSERT_EQ(response.found.size(), 1U);
+  EXPECT_EQ(response.found[0].key, "k");
+  EXPECT_EQ(response.found[0].value, "");
+  EXPECT_EQ(response.found[0].modRevision, 4);
 }
 
 TEST(Protocol, AChangeComparesTheRevisionAndAsksWhatIsThereOtherwise) {

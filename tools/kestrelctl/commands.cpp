@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Thin: a sub-command reads its words, makes one call of the store and prints the answer. What may
-// be stored and how is the store's business.
+// Thin: a sub-command reads its options, makes one call of the store and prints the answer. What
+// may be stored and how is the store's business.
 #include "kestrelctl/commands.h"
 
 #include <array>
@@ -28,12 +28,12 @@ using Tools::ExitStatus;
 using Tools::Failure;
 using Tools::printable;
 
-// The words of a command line, whichever the sub-command has. An empty word is a word too, so a
+// The options of a command line, whichever the sub-command has. An empty word is a word too, so a
 // count tells which ones were given.
-struct Words {
+struct Options {
   ObjectId id;
   std::string field, value, type, file;
-  size_t idWords = 0;
+  size_t idParts = 0;
   bool hasField = false;
 };
 
@@ -45,39 +45,39 @@ std::shared_ptr<Kestrel::Backend> existingStore(Access access) {
   return store;
 }
 
-Failure noObject(const Words &words) {
-  return {Tools::kExitNotFound, printable(describe(words.id)) + ": no such object"};
+Failure noObject(const Options &options) {
+  return {Tools::kExitNotFound, printable(describe(options.id)) + ": no such object"};
 }
 
-Failure noField(const Words &words) {
+Failure noField(const Options &options) {
   return {Tools::kExitNotFound,
-          printable(describe(words.id)) + ": no such field: " + printable(words.field)};
+          printable(describe(options.id)) + ": no such field: " + printable(options.field)};
 }
 
-Kestrel::Value valueOf(const Words &words) {
-  if (words.type.empty()) return Kestrel::parseByForm(words.value);
-  const auto type = Kestrel::typeNamed(words.type);
+Kestrel::Value valueOf(const Options &options) {
+  if (options.type.empty()) return Kestrel::parseByForm(options.value);
+  const auto type = Kestrel::typeNamed(options.type);
   if (!type) {
-    throw Kestrel::ValueError("--type: \"" + printable(words.type) + "\" is none of " +
+    throw Kestrel::ValueError("--type: \"" + printable(options.type) + "\" is none of " +
                               std::string(Kestrel::kTypeNames));
   }
-  return Kestrel::parseAs(*type, words.value);
+  return Kestrel::parseAs(*type, options.value);
 }
 
 // What the line says must be sound before a store is touched.
-Kestrel::Value checkedValue(const Words &words) {
+Kestrel::Value checkedValue(const Options &options) {
   try {
-    Kestrel::checkId(words.id);
-    Kestrel::checkFieldName(words.field);
-    return valueOf(words);
+    Kestrel::checkId(options.id);
+    Kestrel::checkFieldName(options.field);
+    return valueOf(options);
   } catch (const Kestrel::ValueError &error) {
     throw Failure(Tools::kExitUsage, error.what());
   }
 }
 
-ExitStatus set(const Words &words) {
-  const Kestrel::Value value = checkedValue(words);
-  Kestrel::openBackend(Access::kCreate)->setField(words.id, words.field, value);
+ExitStatus set(const Options &options) {
+  const Kestrel::Value value = checkedValue(options);
+  Kestrel::openBackend(Access::kCreate)->setField(options.id, options.field, value);
   return Tools::kExitSuccess;
 }
 
@@ -88,31 +88,31 @@ void printFields(const std::string &before, const Kestrel::Fields &fields) {
   }
 }
 
-ExitStatus get(const Words &words) {
-  const auto fields = existingStore(Access::kRead)->read(words.id);
-  if (!fields) throw noObject(words);
-  if (!words.hasField) {
+ExitStatus get(const Options &options) {
+  const auto fields = existingStore(Access::kRead)->read(options.id);
+  if (!fields) throw noObject(options);
+  if (!options.hasField) {
     printFields("", *fields);
     return Tools::kExitSuccess;
   }
-  const auto found = fields->find(words.field);
-  if (found == fields->end()) throw noField(words);
+  const auto found = fields->find(options.field);
+  if (found == fields->end()) throw noField(options);
   std::cout << print(found->second) << '\n';
   return Tools::kExitSuccess;
 }
 
-ExitStatus remove(const Words &words) {
+ExitStatus remove(const Options &options) {
   const auto store = existingStore(Access::kChange);
-  const bool removed =
-      words.hasField ? store->removeField(words.id, words.field) : store->removeObject(words.id);
-  if (!removed) throw words.hasField ? noField(words) : noObject(words);
+  const bool removed = options.hasField ? store->removeField(options.id, options.field)
+                                        : store->removeObject(options.id);
+  if (!removed) throw options.hasField ? noField(options) : noObject(options);
   return Tools::kExitSuccess;
 }
 
-ExitStatus list(const Words &words) {
+ExitStatus list(const Options &options) {
   Kestrel::Selection selection;
-  if (words.idWords > 0) selection.component = words.id.component;
-  if (words.idWords > 1) selection.group = words.id.group;
+  if (options.idParts > 0) selection.component = options.id.component;
+  if (options.idParts > 1) selection.group = options.id.group;
   for (const auto &[id, fields] : existingStore(Access::kRead)->list(selection)) {
     const std::string object = printable(id.component) + '\t' + printable(id.group) + '\t' +
                                printable(id.key) + '\t' + printable(id.extra);
@@ -122,18 +122,18 @@ ExitStatus list(const Words &words) {
   return Tools::kExitSuccess;
 }
 
-ExitStatus exportStore(const Words &words) {
-  writeExchangeFile(words.file, existingStore(Access::kRead)->list({}));
+ExitStatus exportStore(const Options &options) {
+  writeExchangeFile(options.file, existingStore(Access::kRead)->list({}));
   return Tools::kExitSuccess;
 }
 
-ExitStatus importStore(const Words &words) {
-  const auto objects = readExchangeFile(words.file);
+ExitStatus importStore(const Options &options) {
+  const auto objects = readExchangeFile(options.file);
   Kestrel::openBackend(Access::kCreate)->replace(objects);
   return Tools::kExitSuccess;
 }
 
-ExitStatus status(const Words &) {
+ExitStatus status(const Options &) {
   constexpr size_t kLabelColumns = 15;
   const Kestrel::Report report = Kestrel::inspect();
   for (const auto &[label, text] : report.details) {
@@ -151,56 +151,56 @@ ExitStatus status(const Words &) {
   throw Failure(Tools::kExitFailure, report.problem);
 }
 
-void idWords(CLI::App &command, Words *words) {
-  command.add_option("COMPONENT", words->id.component, "First part of the object's name")
+void declareIdOptions(CLI::App &command, Options *options) {
+  command.add_option("COMPONENT", options->id.component, "First part of the object's name")
       ->required();
-  command.add_option("GROUP", words->id.group, "Second part of the object's name")->required();
-  command.add_option("KEY", words->id.key, "Third part of the object's name")->required();
-  command.add_option("--extra", words->id.extra, "Fourth part of the object's name")
+  command.add_option("GROUP", options->id.group, "Second part of the object's name")->required();
+  command.add_option("KEY", options->id.key, "Third part of the object's name")->required();
+  command.add_option("--extra", options->id.extra, "Fourth part of the object's name")
       ->type_name("TEXT");
 }
 
-void setWords(CLI::App &command, Words *words) {
-  idWords(command, words);
-  command.add_option("FIELD", words->field, "Name of the field")->required();
-  command.add_option("VALUE", words->value, "Its value; put -- before one that begins with -")
+void declareSetOptions(CLI::App &command, Options *options) {
+  declareIdOptions(command, options);
+  command.add_option("FIELD", options->field, "Name of the field")->required();
+  command.add_option("VALUE", options->value, "Its value; put -- before one that begins with -")
       ->required();
   command
-      .add_option("--type", words->type, "integer, real, boolean or text; otherwise by its form")
+      .add_option("--type", options->type, "integer, real, boolean or text; otherwise by its form")
       ->type_name("TYPE");
 }
 
-void fieldWords(CLI::App &command, Words *words) {
-  idWords(command, words);
-  command.add_option("FIELD", words->field, "Only this field")->each([words](const std::string &) {
-    words->hasField = true;
-  });
+void declareFieldOptions(CLI::App &command, Options *options) {
+  declareIdOptions(command, options);
+  command.add_option("FIELD", options->field, "Only this field")
+      ->each([options](const std::string &) { options->hasField = true; });
 }
 
-void listWords(CLI::App &command, Words *words) {
-  const auto count = [words](const std::string &) { ++words->idWords; };
-  command.add_option("COMPONENT", words->id.component, "Only this component")->each(count);
-  command.add_option("GROUP", words->id.group, "Only this group")->each(count);
+void declareListOptions(CLI::App &command, Options *options) {
+  const auto count = [options](const std::string &) { ++options->idParts; };
+  command.add_option("COMPONENT", options->id.component, "Only this component")->each(count);
+  command.add_option("GROUP", options->id.group, "Only this group")->each(count);
 }
 
-void exportWords(CLI::App &command, Words *words) {
-  command.add_option("FILE", words->file, "File to write instead of standard output");
+void declareExportOptions(CLI::App &command, Options *options) {
+  command.add_option("FILE", options->file, "File to write instead of standard output");
 }
 
-void importWords(CLI::App &command, Words *words) {
-  command.add_option("FILE", words->file, "File to read; - is standard input")->required();
+void declareImportOptions(CLI::App &command, Options *options) {
+  command.add_option("FILE", options->file, "File to read; - is standard input")->required();
 }
 
-void noWords(CLI::App &, Words *) {}
+void declareNoOptions(CLI::App &, Options *) {}
 
-constexpr std::array<Tools::Command<Words>, 7> kCommands = {{
-    {"set", "Writes one field of an object", setWords, set},
-    {"get", "Prints a field's value, or all fields of an object", fieldWords, get},
-    {"delete", "Deletes a field, or a whole object", fieldWords, remove},
-    {"list", "Prints all fields, one a line", listWords, list},
-    {"export", "Writes all objects as YAML", exportWords, exportStore},
-    {"import", "Puts a file's objects in the store, all or none", importWords, importStore},
-    {"status", "Tells which store this is and whether it can be used", noWords, status},
+constexpr std::array<Tools::Command<Options>, 7> kCommands = {{
+    {"set", "Writes one field of an object", declareSetOptions, set},
+    {"get", "Prints a field's value, or all fields of an object", declareFieldOptions, get},
+    {"delete", "Deletes a field, or a whole object", declareFieldOptions, remove},
+    {"list", "Prints all fields, one a line", declareListOptions, list},
+    {"export", "Writes all objects as YAML", declareExportOptions, exportStore},
+    {"import", "Puts a file's objects in the store, all or none", declareImportOptions,
+     importStore},
+    {"status", "Tells which store this is and whether it can be used", declareNoOptions, status},
 }};
 
 }  // namespace

@@ -24,7 +24,7 @@ namespace {
 using Platform::UniqueFd;
 
 // More than any store of one host; keeps a mistaken path from filling the memory.
-constexpr size_t kMostBytes = size_t{1} << 30;
+constexpr size_t kMaxBytes = size_t{1} << 30;
 
 Tools::Failure systemFailure(const std::string &file, int error) {
   return {Tools::kExitFailure, file + ": " + std::generic_category().message(error)};
@@ -72,7 +72,7 @@ std::string standardInput() {
 
 std::string content(const std::string &file) {
   try {
-    return Platform::readFile(file, kMostBytes);
+    return Platform::readFile(file, kMaxBytes);
   } catch (const std::system_error &error) {
     throw systemFailure(file, error.code().value());
   }

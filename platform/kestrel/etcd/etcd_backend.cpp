@@ -24,9 +24,9 @@ namespace {
 using Milliseconds = std::chrono::milliseconds;
 
 // A change that others keep overtaking ends at the first of these.
-constexpr int kMostAttempts = 100;
-constexpr Milliseconds kMostTime{10000};
-constexpr int kMostPauseMs = 50;
+constexpr int kMaxAttempts = 100;
+constexpr Milliseconds kMaxTime{10000};
+constexpr int kMaxPauseMs = 50;
 
 constexpr int64_t kPageSize = 512;
 
@@ -61,9 +61,9 @@ class EtcdBackend : public Backend {
   std::optional<Fields> read(const ObjectId &id) override {
     RangeRequest request;
     request.key = objectKey(prefix_, id);
-    const RangeAnswer answer = lookUp(std::move(request), Request::Kind::kRead);
-    if (answer.found.empty()) return std::nullopt;
-    return fieldsOf(answer.found.front());
+    const RangeResponse response = lookUp(std::move(request), Request::Kind::kRead);
+    if (response.found.empty()) return std::nullopt;
+    return fieldsOf(response.found.front());
   }
 
   std::vector<StoredObject> list(const Selection &selection) override {
@@ -130,16 +130,16 @@ class EtcdBackend : public Backend {
 
  private:
   // A read of the run's revision, or of the present one, which is then the run's.
-  RangeAnswer lookUp(RangeRequest request, Request::Kind kind) {
+  RangeResponse lookUp(RangeRequest request, Request::Kind kind) {
     request.serializable = true;
     request.revision = revision_;
     const std::string subject = request.key;
-    RangeAnswer answer;
+    RangeResponse response;
     try {
       members_.ask({kind, kRangePath, rangeText(request), subject}, [&](const std::string &json) {
-        answer = readRange(json);
-        check(answer.header);
-        check(request, answer);
+        response = readRange(json);
+        check(response.header);
+        check(request, response);
       });
     } catch (const RequestRefused &refused) {
       if (refused.why() != RequestRefused::Why::kCompacted) throw;
@@ -148,8 +148,8 @@ class EtcdBackend : public Backend {
       members_.giveUp(why);
       throw storeError("etcd", subject, why);
     }
-    if (revision_ == 0) revision_ = answer.header.revision;
-    return answer;
+    if (revision_ == 0) revision_ = response.header.revision;
+    return response;
   }
 
   // Members of one cluster have one history; another cluster's revision would mean nothing.
@@ -161,8 +161,8 @@ class EtcdBackend : public Backend {
     cluster_ = header.cluster;
   }
 
-  static void check(const RangeRequest &request, const RangeAnswer &answer) {
-    for (const KeyValue &pair : answer.found) {
+  static void check(const RangeRequest &request, const RangeResponse &response) {
+    for (const KeyValue &pair : response.found) {
       const bool asked = request.end.empty() ? pair.key == request.key
                                              : pair.key >= request.key && pair.key < request.end;
       if (!asked) throw ProtocolError("with a key that was not asked for");
@@ -171,23 +171,23 @@ class EtcdBackend : public Backend {
 
   // false: this was the last page. The next one begins behind the last key of this one.
   bool takePage(RangeRequest *request, std::vector<StoredObject> *objects) {
-    const RangeAnswer answer = [&] {
+    const RangeResponse response = [&] {
       for (;;) {
         try {
           return lookUp(*request, Request::Kind::kPage);
         } catch (const RequestRefused &refused) {
-          if (refused.why() != RequestRefused::Why::kTooLargeAnswer || request->limit == 1) throw;
+          if (refused.why() != RequestRefused::Why::kTooLargeResponse || request->limit == 1) throw;
           request->limit /= 2;
         }
       }
     }();
-    for (const KeyValue &pair : answer.found) {
+    for (const KeyValue &pair : response.found) {
       auto id = objectId(prefix_, pair.key);
       if (!id) throw storeError("etcd", pair.key, "the key is no object's");
       objects->push_back({std::move(*id), fieldsOf(pair)});
     }
-    if (!answer.more || answer.found.empty()) return false;
-    request->key = answer.found.back().key + '\0';
+    if (!response.more || response.found.empty()) return false;
+    request->key = response.found.back().key + '\0';
     return true;
   }
 
@@ -200,15 +200,15 @@ class EtcdBackend : public Backend {
   std::optional<KeyValue> present(const std::string &key) {
     RangeRequest request;
     request.key = key;
-    RangeAnswer answer;
+    RangeResponse response;
     members_.ask({Request::Kind::kRead, kRangePath, rangeText(request), key},
                  [&](const std::string &json) {
-                   answer = readRange(json);
-                   check(answer.header);
-                   check(request, answer);
+                   response = readRange(json);
+                   check(response.header);
+                   check(request, response);
                  });
-    if (answer.found.empty()) return std::nullopt;
-    return std::move(answer.found.front());
+    if (response.found.empty()) return std::nullopt;
+    return std::move(response.found.front());
   }
 
   // Compare and swap: makes the change on what the key holds, as long as nobody else changes it in
@@ -216,37 +216,37 @@ class EtcdBackend : public Backend {
   // change. An object goes with its last field.
   template <typename Apply>
   bool change(const std::string &key, const Apply &apply) {
-    const Deadline deadline(kMostTime);
+    const Deadline deadline(kMaxTime);
     std::optional<KeyValue> found = present(key);
     for (int attempt = 1;; ++attempt) {
       Fields fields = found ? fieldsOf(*found) : Fields{};
       if (!apply(&fields)) return false;
       ChangeRequest request{key, found ? found->modRevision : 0, std::nullopt};
       if (!fields.empty()) request.value = valueOf(key, fields);
-      ChangeAnswer answer = send(request);
-      if (answer.done) return true;
-      if (attempt == kMostAttempts || deadline.passed()) {
+      ChangeResponse response = send(request);
+      if (response.done) return true;
+      if (attempt == kMaxAttempts || deadline.passed()) {
         throw storeError("etcd", key, "others keep changing it; nothing was changed");
       }
-      found = std::move(answer.found);
+      found = std::move(response.found);
       std::this_thread::sleep_for(pauseAfter(attempt));
     }
   }
 
   // Writers that met once should not meet again.
   Milliseconds pauseAfter(int attempt) {
-    const int most = std::min(1 << std::min(attempt, 10), kMostPauseMs);
+    const int most = std::min(1 << std::min(attempt, 10), kMaxPauseMs);
     return Milliseconds(std::uniform_int_distribution<int>(0, most)(random_));
   }
 
-  ChangeAnswer send(const ChangeRequest &request) {
-    ChangeAnswer answer;
+  ChangeResponse send(const ChangeRequest &request) {
+    ChangeResponse response;
     members_.ask({Request::Kind::kChange, kTransactionPath, changeText(request), request.key},
                  [&](const std::string &json) {
-                   answer = readChange(json);
-                   if (answer.done) ownChange(answer.header);
+                   response = readChange(json);
+                   if (response.done) ownChange(response.header);
                  });
-    return answer;
+    return response;
   }
 
   std::string prefix_;

@@ -17,14 +17,14 @@ namespace {
 
 struct Sink {
   std::string body;
-  size_t mostBytes;
+  size_t maxBytes;
   bool tooLarge = false;
 };
 
 size_t take(char *data, size_t size, size_t count, void *target) {
   auto *sink = static_cast<Sink *>(target);
   const size_t bytes = size * count;
-  if (bytes > sink->mostBytes - sink->body.size()) {
+  if (bytes > sink->maxBytes - sink->body.size()) {
     sink->tooLarge = true;
     return 0;
   }
@@ -123,11 +123,11 @@ void HttpClient::setHeaders(const std::string &token) {
   token_ = token;
 }
 
-HttpAnswer HttpClient::post(const std::string &url, const std::string &json,
-                            const std::string &token, TimeLimits limits, size_t mostBytes) {
+HttpResponse HttpClient::post(const std::string &url, const std::string &json,
+                              const std::string &token, TimeLimits limits, size_t maxBytes) {
   CURL *handle = handle_.get();
   if (token != token_) setHeaders(token);
-  Sink sink{{}, mostBytes};
+  Sink sink{{}, maxBytes};
   set(handle, CURLOPT_URL, url.c_str());
   set(handle, CURLOPT_POSTFIELDS, json.c_str());
   set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(json.size()));
@@ -138,27 +138,27 @@ HttpAnswer HttpClient::post(const std::string &url, const std::string &json,
 
   const SignalGuard guard;
   const CURLcode result = curl_easy_perform(handle);
-  HttpAnswer answer = interpret(result, sink.tooLarge);
-  if (answer.end == HttpAnswer::End::kAnswered) answer.body = std::move(sink.body);
-  return answer;
+  HttpResponse response = interpret(result, sink.tooLarge);
+  if (response.end == HttpResponse::End::kCompleted) response.body = std::move(sink.body);
+  return response;
 }
 
-HttpAnswer HttpClient::interpret(CURLcode result, bool tooLarge) const {
-  HttpAnswer answer;
+HttpResponse HttpClient::interpret(CURLcode result, bool tooLarge) const {
+  HttpResponse response;
   if (result == CURLE_OK) {
-    answer.end = HttpAnswer::End::kAnswered;
-    curl_easy_getinfo(handle_.get(), CURLINFO_RESPONSE_CODE, &answer.status);
-    return answer;
+    response.end = HttpResponse::End::kCompleted;
+    curl_easy_getinfo(handle_.get(), CURLINFO_RESPONSE_CODE, &response.status);
+    return response;
   }
   long sent = 0;
   curl_easy_getinfo(handle_.get(), CURLINFO_REQUEST_SIZE, &sent);
-  answer.end = tooLarge    ? HttpAnswer::End::kTooLarge
-               : sent == 0 ? HttpAnswer::End::kNotReached
-                           : HttpAnswer::End::kNoAnswer;
-  answer.problem = tooLarge                ? "the answer is too large"
-                   : errorText_[0] != '\0' ? errorText_.data()
-                                           : curl_easy_strerror(result);
-  return answer;
+  response.end = tooLarge    ? HttpResponse::End::kTooLarge
+                 : sent == 0 ? HttpResponse::End::kNotReached
+                             : HttpResponse::End::kNoResponse;
+  response.problem = tooLarge                ? "the answer is too large"
+                     : errorText_[0] != '\0' ? errorText_.data()
+                                             : curl_easy_strerror(result);
+  return response;
 }
 
 }  // namespace Kestrel::Etcd

@@ -15,11 +15,11 @@
 
 namespace Kestrel::Etcd {
 
-struct HttpAnswer {
+struct HttpResponse {
   enum class End {
-    kAnswered,    // status and body hold
+    kCompleted,   // status and body hold
     kNotReached,  // the server got nothing of the request
-    kNoAnswer,    // the server may have acted on the request
+    kNoResponse,  // the server may have acted on the request
     kTooLarge,    // the body is larger than the caller takes
   };
 
@@ -42,9 +42,9 @@ class HttpClient {
   explicit HttpClient(const Configuration &configuration);
 
   // Sends a JSON text and waits for the whole answer. token: for the Authorization header; empty:
-  // none. mostBytes: the largest body that is taken.
-  HttpAnswer post(const std::string &url, const std::string &json, const std::string &token,
-                  TimeLimits limits, size_t mostBytes);
+  // none. maxBytes: the largest body that is taken.
+  HttpResponse post(const std::string &url, const std::string &json, const std::string &token,
+                    TimeLimits limits, size_t maxBytes);
 
  private:
   struct HandleDeleter {
@@ -57,7 +57,7 @@ class HttpClient {
   void configure();
   void configureTls(const Configuration &configuration);
   void setHeaders(const std::string &token);
-  HttpAnswer interpret(CURLcode result, bool tooLarge) const;
+  HttpResponse interpret(CURLcode result, bool tooLarge) const;
 
   std::array<char, CURL_ERROR_SIZE> errorText_{};
   std::string token_;

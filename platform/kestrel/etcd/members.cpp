@@ -21,7 +21,7 @@ namespace {
 constexpr const char *kPlace = "etcd";
 
 // A member that lags behind by more than this many pauses is as good as dead.
-constexpr int kMostPauses = 100;
+constexpr int kMaxPauses = 100;
 constexpr std::chrono::milliseconds kPause{10};
 
 // What keeps one member from answering.
@@ -35,17 +35,17 @@ class MemberFailure : public std::runtime_error {
 // etcd itself says this as a plain text, before anything else has looked at the request.
 constexpr std::string_view kCommonName = "CommonName of client";
 
-Refusal refusalOf(const HttpAnswer &answer) {
+Refusal refusalOf(const HttpResponse &response) {
   try {
-    if (auto refusal = readRefusal(answer.body)) return std::move(*refusal);
+    if (auto refusal = readRefusal(response.body)) return std::move(*refusal);
   } catch (const ProtocolError &) {
     // As good as any other text.
   }
-  if (answer.body.compare(0, kCommonName.size(), kCommonName) == 0) {
+  if (response.body.compare(0, kCommonName.size(), kCommonName) == 0) {
     throw MemberFailure("it has users, and then takes no client certificate with a common name",
                         false);
   }
-  throw MemberFailure("HTTP status " + std::to_string(answer.status) + ", and no word of etcd's",
+  throw MemberFailure("HTTP status " + std::to_string(response.status) + ", and no word of etcd's",
                       true);
 }
 
@@ -109,17 +109,17 @@ void Members::attempt(const Member &member, const Request &request, const Read &
   bool renewed = false;
   for (int pauses = 0;;) {
     if (!token_) authenticate(member, part);
-    const HttpAnswer answer =
+    const HttpResponse response =
         send(member, request, {part.left(), change ? whole.left() : part.left()});
-    if (answer.status == 200) return readOrFail(read, answer.body);
+    if (response.status == 200) return readOrFail(read, response.body);
 
-    const Refusal refusal = refusalOf(answer);
+    const Refusal refusal = refusalOf(response);
     switch (meaningOf(refusal, change)) {
       case Meaning::kToken:
         renewToken(member, request, refusal, &renewed);
         continue;
       case Meaning::kBehind:
-        if (++pauses > kMostPauses || part.passed()) {
+        if (++pauses > kMaxPauses || part.passed()) {
           throw MemberFailure("it lags behind: " + refusal.message, false);
         }
         std::this_thread::sleep_for(std::min(kPause, part.left()));
@@ -136,15 +136,15 @@ void Members::attempt(const Member &member, const Request &request, const Read &
   }
 }
 
-HttpAnswer Members::send(const Member &member, const Request &request, TimeLimits limits) {
-  HttpAnswer answer = http_.post(member.url + request.path, request.json, token_.value_or(""),
-                                 limits, kMostAnswerBytes);
-  if (answer.end == HttpAnswer::End::kAnswered) return answer;
-  if (answer.end == HttpAnswer::End::kTooLarge && request.kind == Request::Kind::kPage) {
-    throw RequestRefused(RequestRefused::Why::kTooLargeAnswer,
-                         storeError(member.url, request.subject, answer.problem).what());
+HttpResponse Members::send(const Member &member, const Request &request, TimeLimits limits) {
+  HttpResponse response = http_.post(member.url + request.path, request.json, token_.value_or(""),
+                                     limits, kMaxResponseBytes);
+  if (response.end == HttpResponse::End::kCompleted) return response;
+  if (response.end == HttpResponse::End::kTooLarge && request.kind == Request::Kind::kPage) {
+    throw RequestRefused(RequestRefused::Why::kTooLargeResponse,
+                         storeError(member.url, request.subject, response.problem).what());
   }
-  throw MemberFailure(answer.problem, answer.end != HttpAnswer::End::kNotReached);
+  throw MemberFailure(response.problem, response.end != HttpResponse::End::kNotReached);
 }
 
 void Members::authenticate(const Member &member, const Deadline &part) {
@@ -153,7 +153,7 @@ void Members::authenticate(const Member &member, const Deadline &part) {
   const Request request{Request::Kind::kRead, kAuthenticatePath, authenticateText(user_, password),
                         subject};
   token_ = "";
-  const HttpAnswer answer = [&] {
+  const HttpResponse response = [&] {
     try {
       return send(member, request, {part.left(), part.left()});
     } catch (...) {
@@ -162,10 +162,10 @@ void Members::authenticate(const Member &member, const Deadline &part) {
     }
   }();
   token_.reset();
-  if (answer.status == 200) {
-    return readOrFail([this](const std::string &json) { token_ = readToken(json); }, answer.body);
+  if (response.status == 200) {
+    return readOrFail([this](const std::string &json) { token_ = readToken(json); }, response.body);
   }
-  const Refusal refusal = refusalOf(answer);
+  const Refusal refusal = refusalOf(response);
   switch (meaningOf(refusal, false)) {
     case Meaning::kNoUsers:
       token_ = "";
@@ -205,13 +205,13 @@ std::string Members::failures() const {
 
 std::string Members::condition(const std::string &endpoint) {
   const auto start = Deadline::Clock::now();
-  const HttpAnswer answer =
-      http_.post(endpoint + kStatusPath, "{}", "", {timeout_, timeout_}, kMostAnswerBytes);
+  const HttpResponse response =
+      http_.post(endpoint + kStatusPath, "{}", "", {timeout_, timeout_}, kMaxResponseBytes);
   const auto time = Deadline::Clock::now() - start;
-  if (answer.end != HttpAnswer::End::kAnswered) return "does not answer: " + answer.problem;
+  if (response.end != HttpResponse::End::kCompleted) return "does not answer: " + response.problem;
   try {
-    if (answer.status != 200) return "answers: " + describe(refusalOf(answer));
-    const StatusAnswer status = readStatus(answer.body);
+    if (response.status != 200) return "answers: " + describe(refusalOf(response));
+    const StatusResponse status = readStatus(response.body);
     return "etcd " + status.version + ", answers in " + milliseconds(time) +
            (status.hasLeader ? "" : ", has no leader: takes no change");
   } catch (const ProtocolError &error) {

@@ -22,7 +22,7 @@ namespace Kestrel::Etcd {
 // The cluster's answer is no: another member would say the same.
 class RequestRefused : public KestrelConfigStore::ConfigStoreException {
  public:
-  enum class Why { kCompacted, kTooLargeAnswer, kOther };
+  enum class Why { kCompacted, kTooLargeResponse, kOther };
 
   RequestRefused(Why why, std::string message)
       : ConfigStoreException(std::move(message)), why_(why) {}
@@ -48,7 +48,7 @@ struct Request {
 class Members {
  public:
   // No larger answer is taken. etcd itself takes no value beyond 1.5 MiB unless it is told to.
-  static constexpr size_t kMostAnswerBytes = size_t{16} << 20;
+  static constexpr size_t kMaxResponseBytes = size_t{16} << 20;
 
   // Asks no server. Throws a ConfigStoreException when the settings cannot be used.
   explicit Members(const Configuration &configuration);
@@ -77,7 +77,7 @@ class Members {
   std::vector<Member *> usable();
   void attempt(const Member &member, const Request &request, const Read &read, const Deadline &part,
                const Deadline &whole);
-  HttpAnswer send(const Member &member, const Request &request, TimeLimits limits);
+  HttpResponse send(const Member &member, const Request &request, TimeLimits limits);
   void authenticate(const Member &member, const Deadline &part);
   void renewToken(const Member &member, const Request &request, const Refusal &refusal,
                   bool *renewed);

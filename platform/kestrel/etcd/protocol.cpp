@@ -27,12 +27,12 @@ std::string putText(const std::string &key, const std::string &value) {
 }
 
 // No answer of etcd's is deeper than this. Foreign text without end must not become a tree of it.
-constexpr int kMostDepth = 16;
+constexpr int kMaxDepth = 16;
 
 // Discarded: not JSON.
 Json parse(const std::string &json) {
   const auto limitDepth = [](int depth, Json::parse_event_t, const Json &) {
-    if (depth > kMostDepth) throw ProtocolError("nested too deeply");
+    if (depth > kMaxDepth) throw ProtocolError("nested too deeply");
     return true;
   };
   return Json::parse(json, limitDepth, false);
@@ -87,8 +87,8 @@ bool truth(const Json &object, const char *name) {
   return found != nullptr && found->get<bool>();
 }
 
-Header headerOf(const Json &answer) {
-  const Json *header = findOf(answer, "header", Json::value_t::object);
+Header headerOf(const Json &response) {
+  const Json *header = findOf(response, "header", Json::value_t::object);
   if (header == nullptr) throw ProtocolError("without a \"header\"");
   return {text(*header, "cluster_id"), number(*header, "revision")};
 }
@@ -105,8 +105,8 @@ std::vector<KeyValue> keyValues(const Json &range) {
 }
 
 // The one range of a transaction that was not made.
-std::optional<KeyValue> foundInstead(const Json &answer) {
-  const Json *responses = findOf(answer, "responses", Json::value_t::array);
+std::optional<KeyValue> foundInstead(const Json &response) {
+  const Json *responses = findOf(response, "responses", Json::value_t::array);
   if (responses == nullptr || responses->size() != 1 || !responses->front().is_object()) {
     throw ProtocolError("without what the key holds");
   }
@@ -155,15 +155,15 @@ std::string authenticateText(const std::string &user, const std::string &passwor
   return json.dump(-1, ' ', false, Json::error_handler_t::replace);
 }
 
-RangeAnswer readRange(const std::string &json) {
-  const Json answer = parseObject(json);
-  return {headerOf(answer), keyValues(answer), truth(answer, "more")};
+RangeResponse readRange(const std::string &json) {
+  const Json response = parseObject(json);
+  return {headerOf(response), keyValues(response), truth(response, "more")};
 }
 
-ChangeAnswer readChange(const std::string &json) {
-  const Json answer = parseObject(json);
-  ChangeAnswer result{headerOf(answer), truth(answer, "succeeded"), std::nullopt};
-  if (!result.done) result.found = foundInstead(answer);
+ChangeResponse readChange(const std::string &json) {
+  const Json response = parseObject(json);
+  ChangeResponse result{headerOf(response), truth(response, "succeeded"), std::nullopt};
+  if (!result.done) result.found = foundInstead(response);
   return result;
 }
 
@@ -172,9 +172,9 @@ Header readHeader(const std::string &json) {
 }
 
 int64_t readDeleted(const std::string &json) {
-  const Json answer = parseObject(json);
-  (void)headerOf(answer);
-  return number(answer, "deleted");
+  const Json response = parseObject(json);
+  (void)headerOf(response);
+  return number(response, "deleted");
 }
 
 std::string readToken(const std::string &json) {
@@ -186,18 +186,18 @@ std::string readToken(const std::string &json) {
   return token;
 }
 
-StatusAnswer readStatus(const std::string &json) {
-  const Json answer = parseObject(json);
-  const std::string leader = text(answer, "leader");  // a member's id, of 64 bits without a sign
-  return {headerOf(answer), text(answer, "version"), !leader.empty() && leader != "0"};
+StatusResponse readStatus(const std::string &json) {
+  const Json response = parseObject(json);
+  const std::string leader = text(response, "leader");  // a member's id, of 64 bits without a sign
+  return {headerOf(response), text(response, "version"), !leader.empty() && leader != "0"};
 }
 
 std::optional<Refusal> readRefusal(const std::string &json) {
-  const Json answer = parse(json);
-  if (!answer.is_object()) return std::nullopt;
-  const Json *code = find(answer, "code");
-  const Json *message = find(answer, "message");
-  if (message == nullptr) message = find(answer, "error");
+  const Json response = parse(json);
+  if (!response.is_object()) return std::nullopt;
+  const Json *code = find(response, "code");
+  const Json *message = find(response, "message");
+  if (message == nullptr) message = find(response, "error");
   if (code == nullptr || !code->is_number_integer()) return std::nullopt;
   if (message == nullptr || !message->is_string()) return std::nullopt;
   return Refusal{code->get<int64_t>(), message->get<std::string>()};

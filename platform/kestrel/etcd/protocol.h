@@ -43,7 +43,7 @@ struct RangeRequest {
   int64_t revision = 0;       // 0: the present one
 };
 
-struct RangeAnswer {
+struct RangeResponse {
   Header header;
   std::vector<KeyValue> found;
   bool more = false;  // the limit left some out
@@ -57,13 +57,13 @@ struct ChangeRequest {
   std::optional<std::string> value;
 };
 
-struct ChangeAnswer {
+struct ChangeResponse {
   Header header;
   bool done = false;
   std::optional<KeyValue> found;  // when not done
 };
 
-struct StatusAnswer {
+struct StatusResponse {
   Header header;
   std::string version;
   bool hasLeader = false;
@@ -82,12 +82,12 @@ std::string deleteText(const std::string &key);
 std::string authenticateText(const std::string &user, const std::string &password);
 
 // All throw ProtocolError.
-RangeAnswer readRange(const std::string &json);
-ChangeAnswer readChange(const std::string &json);
+RangeResponse readRange(const std::string &json);
+ChangeResponse readChange(const std::string &json);
 Header readHeader(const std::string &json);
 int64_t readDeleted(const std::string &json);
 std::string readToken(const std::string &json);
-StatusAnswer readStatus(const std::string &json);
+StatusResponse readStatus(const std::string &json);
 
 // Nothing: the text is no refusal of etcd's. Throws ProtocolError as the others do.
 std::optional<Refusal> readRefusal(const std::string &json);
