@@ -13,7 +13,7 @@
 
 #include "common/unique_fd.h"
 #include "kestrel/errors.h"
-#include "kestrel/sqlite_schema.h"
+#include "kestrel/sqlite_tables.h"
 
 namespace Kestrel {
 

@@ -28,13 +28,13 @@ using Tools::ExitStatus;
 using Tools::Failure;
 using Tools::printable;
 
-// The options of a command line, whichever the sub-command has. An empty word is a word too, so a
-// count tells which ones were given.
+// The options of all sub-commands. An argument may be empty, so it is counted when it is given.
 struct Options {
   ObjectId id;
   std::string field, value, type, file;
   size_t idParts = 0;
   bool hasField = false;
+  bool keepGoing = false;
 };
 
 // The store, for a command that makes no sense without one.
@@ -64,7 +64,7 @@ Kestrel::Value valueOf(const Options &options) {
   return Kestrel::parseAs(*type, options.value);
 }
 
-// What the line says must be sound before a store is touched.
+// The command line is checked before a store is touched.
 Kestrel::Value checkedValue(const Options &options) {
   try {
     Kestrel::checkId(options.id);
@@ -109,22 +109,50 @@ ExitStatus remove(const Options &options) {
   return Tools::kExitSuccess;
 }
 
+void printDamage(std::ostream &out, const std::vector<Kestrel::Damage> &damaged) {
+  for (const auto &[name, why] : damaged) out << printable(name) << ": " << printable(why) << '\n';
+}
+
+// The objects of a listing. A damaged one is an error, unless the user wants the others.
+const std::vector<Kestrel::StoredObject> &objectsOf(const Kestrel::Listing &listing,
+                                                    const Options &options) {
+  if (listing.damaged.empty()) return listing.objects;
+  if (!options.keepGoing) {
+    const auto &[name, why] = listing.damaged.front();
+    throw Failure(Tools::kExitFailure,
+                  printable(name) + ": " + printable(why) + " (" +
+                      std::to_string(listing.damaged.size()) +
+                      " damaged in all: see kestrelctl check; --keep-going leaves them out)");
+  }
+  std::cerr << "kestrelctl: damaged objects are left out:\n";
+  printDamage(std::cerr, listing.damaged);
+  return listing.objects;
+}
+
 ExitStatus list(const Options &options) {
   Kestrel::Selection selection;
   if (options.idParts > 0) selection.component = options.id.component;
   if (options.idParts > 1) selection.group = options.id.group;
-  for (const auto &[id, fields] : existingStore(Access::kRead)->list(selection)) {
+  const Kestrel::Listing listing = existingStore(Access::kRead)->list(selection);
+  for (const auto &[id, fields] : objectsOf(listing, options)) {
     const std::string object = printable(id.component) + '\t' + printable(id.group) + '\t' +
                                printable(id.key) + '\t' + printable(id.extra);
     if (fields.empty()) std::cout << object << "\t\t\t\n";
     printFields(object + '\t', fields);
   }
-  return Tools::kExitSuccess;
+  return listing.damaged.empty() ? Tools::kExitSuccess : Tools::kExitFailure;
 }
 
 ExitStatus exportStore(const Options &options) {
-  writeExchangeFile(options.file, existingStore(Access::kRead)->list({}));
-  return Tools::kExitSuccess;
+  const Kestrel::Listing listing = existingStore(Access::kRead)->list({});
+  writeExchangeFile(options.file, objectsOf(listing, options));
+  return listing.damaged.empty() ? Tools::kExitSuccess : Tools::kExitFailure;
+}
+
+ExitStatus check(const Options &) {
+  const Kestrel::Listing listing = existingStore(Access::kRead)->list({});
+  printDamage(std::cout, listing.damaged);
+  return listing.damaged.empty() ? Tools::kExitSuccess : Tools::kExitFailure;
 }
 
 ExitStatus importStore(const Options &options) {
@@ -145,6 +173,7 @@ ExitStatus status(const Options &) {
       return Tools::kExitSuccess;
     case Kestrel::Condition::kMissing:
       throw Failure(Tools::kExitNotFound, report.problem);
+    case Kestrel::Condition::kLimited:
     case Kestrel::Condition::kUnusable:
       break;
   }
@@ -176,14 +205,21 @@ void declareFieldOptions(CLI::App &command, Options *options) {
       ->each([options](const std::string &) { options->hasField = true; });
 }
 
+void declareKeepGoing(CLI::App &command, Options *options) {
+  command.add_flag("--keep-going", options->keepGoing,
+                   "Leave damaged objects out, and report them on standard error");
+}
+
 void declareListOptions(CLI::App &command, Options *options) {
   const auto count = [options](const std::string &) { ++options->idParts; };
   command.add_option("COMPONENT", options->id.component, "Only this component")->each(count);
   command.add_option("GROUP", options->id.group, "Only this group")->each(count);
+  declareKeepGoing(command, options);
 }
 
 void declareExportOptions(CLI::App &command, Options *options) {
   command.add_option("FILE", options->file, "File to write instead of standard output");
+  declareKeepGoing(command, options);
 }
 
 void declareImportOptions(CLI::App &command, Options *options) {
@@ -192,15 +228,16 @@ void declareImportOptions(CLI::App &command, Options *options) {
 
 void declareNoOptions(CLI::App &, Options *) {}
 
-constexpr std::array<Tools::Command<Options>, 7> kCommands = {{
+constexpr std::array<Tools::Command<Options>, 8> kCommands = {{
     {"set", "Writes one field of an object", declareSetOptions, set},
     {"get", "Prints a field's value, or all fields of an object", declareFieldOptions, get},
     {"delete", "Deletes a field, or a whole object", declareFieldOptions, remove},
-    {"list", "Prints all fields, one a line", declareListOptions, list},
+    {"list", "Prints all fields, one per line", declareListOptions, list},
+    {"check", "Prints the damaged objects", declareNoOptions, check},
     {"export", "Writes all objects as YAML", declareExportOptions, exportStore},
     {"import", "Puts a file's objects in the store, all or none", declareImportOptions,
      importStore},
-    {"status", "Tells which store this is and whether it can be used", declareNoOptions, status},
+    {"status", "Prints which store this is and whether it can be used", declareNoOptions, status},
 }};
 
 }  // namespace

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// kestrelctl as its users run it: what each command prints, answers and changes, byte for byte.
+// kestrelctl as its users run it: what each command prints, returns and changes, byte for byte.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -297,11 +297,11 @@ TEST_F(Kestrelctl, StatusTellsWhichStoreAndThatItCanBeUsed) {
   const std::string text = withoutFolder(out({"status"}), world_);
   EXPECT_THAT(text, StartsWith("configuration  FOLDER/kestrel.conf\n"
                                "store          sqlite\n"
-                               "place          FOLDER/store.db\n"
+                               "location       FOLDER/store.db\n"
                                "schema         version 1\n"
                                "objects        1\n"
                                "fields         1\n"
-                               "answers in     "));
+                               "responds in    "));
   EXPECT_THAT(text, HasSubstr(" ms\nstate          usable\n"));
 }
 
