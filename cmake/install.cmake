@@ -1,27 +1,48 @@
 # SPDX-License-Identifier: Apache-2.0
-# Where things go. Outside the system's own folders a program finds the libraries beside it,
-# wherever the whole is put; a library of the same name in LD_LIBRARY_PATH still comes first.
-set(programs)
-set(libraries)
-foreach(name poolctl knobctl kestrelctl poolctl-install)
-  if(TARGET ${name})
-    list(APPEND programs ${name})
-  endif()
-endforeach()
-foreach(name knob kestrelconfig kestrel_etcd)
-  if(TARGET ${name})
-    list(APPEND libraries ${name})
-  endif()
-endforeach()
+# Where things go. Outside the system's own folders a program finds the libraries in ../lib of its
+# own folder, wherever the whole is put; a library of the same name in LD_LIBRARY_PATH still comes
+# first.
+
+# Sets OUT to the targets of TYPE that DIRECTORY and the folders below it define.
+function(collect_targets out type directory)
+  get_property(targets DIRECTORY ${directory} PROPERTY BUILDSYSTEM_TARGETS)
+  set(found)
+  foreach(target ${targets})
+    get_target_property(target_type ${target} TYPE)
+    if(target_type STREQUAL type)
+      list(APPEND found ${target})
+    endif()
+  endforeach()
+  get_property(folders DIRECTORY ${directory} PROPERTY SUBDIRECTORIES)
+  foreach(folder ${folders})
+    collect_targets(below ${type} ${folder})
+    list(APPEND found ${below})
+  endforeach()
+  set(${out} ${found} PARENT_SCOPE)
+endfunction()
+
+collect_targets(programs EXECUTABLE ${CMAKE_SOURCE_DIR}/src)
+collect_targets(tools EXECUTABLE ${CMAKE_SOURCE_DIR}/tools)
+collect_targets(libraries SHARED_LIBRARY ${CMAKE_SOURCE_DIR}/platform)
+list(APPEND programs ${tools})
+
 # The build tree has the same shape and uses the same path: with two different ones CMake pads the
 # first with an empty entry, which makes the loader look for libraries in the current folder.
-if(NOT CMAKE_INSTALL_PREFIX STREQUAL "/usr")
+if(CMAKE_INSTALL_PREFIX STREQUAL "/usr")
+  set_target_properties(${programs} PROPERTIES INSTALL_RPATH "")
+else()
   set_target_properties(${programs} PROPERTIES
     BUILD_WITH_INSTALL_RPATH ON INSTALL_RPATH "$ORIGIN/../lib;${yaml_cpp_rpath}")
   set(CMAKE_INSTALL_LIBDIR lib)
 endif()
+
+# Any user may run a command in a pool that is open to them; the others administer the host.
+set(user_programs poolctl-exec)
+list(REMOVE_ITEM programs ${user_programs})
 install(TARGETS ${programs}
         RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT programs)
+install(TARGETS ${user_programs}
+        RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT programs)
 install(TARGETS ${libraries}
         LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT programs NAMELINK_SKIP)
 file(GLOB manual_pages CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/docs/man/*.[1-8])

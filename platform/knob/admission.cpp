@@ -10,9 +10,9 @@ namespace {
 
 constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
 
-bool withinOwnLimits(const Level &level) {
-  const int64_t reservation = reservationOf(level);
-  const Allocation &limits = level.allocation;
+bool withinOwnLimits(const ResourceState &state) {
+  const int64_t reservation = reservationOf(state);
+  const Allocation &limits = state.allocation;
   return (limits.max == -1 || reservation <= limits.max) &&
          (limits.minLimit == -1 || reservation <= limits.minLimit);
 }
@@ -25,8 +25,8 @@ int64_t replaced(int64_t sum, int64_t before, int64_t after) {
 
 }  // namespace
 
-int64_t reservationOf(const Level &level) {
-  return std::max(level.allocation.min, level.childrenSum);
+int64_t reservationOf(const ResourceState &state) {
+  return std::max(state.allocation.min, state.childrenSum);
 }
 
 int64_t machineCapacity(const HostFacts &facts, Resource resource) {
@@ -34,27 +34,27 @@ int64_t machineCapacity(const HostFacts &facts, Resource resource) {
   return static_cast<int64_t>(facts.memoryKB / 1024);
 }
 
-std::optional<std::vector<Level>> admit(std::vector<Level> levels, const Allocation &wanted,
-                                        int64_t capacity) {
-  int64_t before = reservationOf(levels.front());
-  levels.front().allocation = wanted;
-  if (!withinOwnLimits(levels.front())) return std::nullopt;
-  int64_t after = reservationOf(levels.front());
+std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
+                                                const Allocation &wanted, int64_t capacity) {
+  int64_t before = reservationOf(states.front());
+  states.front().allocation = wanted;
+  if (!withinOwnLimits(states.front())) return std::nullopt;
+  int64_t after = reservationOf(states.front());
 
-  for (size_t above = 1; above < levels.size(); ++above) {
+  for (size_t above = 1; above < states.size(); ++above) {
     if (after == before) {
-      levels.resize(above);
-      return levels;
+      states.resize(above);
+      return states;
     }
-    Level &level = levels[above];
-    const int64_t levelBefore = reservationOf(level);
-    level.childrenSum = replaced(level.childrenSum, before, after);
-    before = levelBefore;
-    after = reservationOf(level);
-    if (after > before && !withinOwnLimits(level)) return std::nullopt;
+    ResourceState &state = states[above];
+    const int64_t stateBefore = reservationOf(state);
+    state.childrenSum = replaced(state.childrenSum, before, after);
+    before = stateBefore;
+    after = reservationOf(state);
+    if (after > before && !withinOwnLimits(state)) return std::nullopt;
   }
   if (after > before && after > capacity) return std::nullopt;
-  return levels;
+  return states;
 }
 
 }  // namespace Knob

@@ -12,21 +12,21 @@
 
 namespace Knob {
 
-// One group as admission sees it.
-struct Level {
+// What a group has been given of one resource, and what its children reserve of it.
+struct ResourceState {
   Allocation allocation;
   int64_t childrenSum = 0;  // of the children's reservations
 };
 
-int64_t reservationOf(const Level &level);
+int64_t reservationOf(const ResourceState &state);
 
 // How much can be reserved in all: MB of physical memory, or 100 percent for each CPU.
 int64_t machineCapacity(const HostFacts &facts, Resource resource);
 
-// levels: the group first, then every group above it, up to the root. Gives the levels as they are
-// once the group has the wanted allocation, or nothing when that does not fit. The levels beyond
-// the last one that changes are left out.
-std::optional<std::vector<Level>> admit(std::vector<Level> levels, const Allocation &wanted,
-                                        int64_t capacity);
+// states: of the group first, then of every group above it, up to the root. Returns the states
+// after the group has the wanted allocation, up to the last one that changes; nothing when the
+// allocation does not fit.
+std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
+                                                const Allocation &wanted, int64_t capacity);
 
 }  // namespace Knob

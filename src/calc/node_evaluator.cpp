@@ -6,8 +6,8 @@
 
 #include "calc/evaluator.h"
 #include "calc/tagged_value.h"
-#include "calc/yaml_node.h"
-#include "loader/exception.h"
+#include "yaml/exception.h"
+#include "yaml/node.h"
 
 namespace Calc {
 namespace {
@@ -25,7 +25,7 @@ float evaluateScalar(const YAML::Node &node, const VariableTable &variables) {
 // The text is read as an expression whatever its tag, and its faults are reported without the
 // rest of the text.
 float evaluateResult(const YAML::Node &result, const VariableTable &variables) {
-  const std::string text = scalarText(result);
+  const std::string text = Yaml::scalarText(result);
   try {
     return Evaluate(text, variables);
   } catch (const Exception &fault) {
@@ -40,20 +40,20 @@ float evaluateMapping(const YAML::Node &node, const VariableTable &variables) {
   YAML::Node last(YAML::NodeType::Undefined);
   bool empty = true;
   for (const auto &entry : node) {
-    const std::string key = scalarText(entry.first);
+    const std::string key = Yaml::scalarText(entry.first);
     if (key != "=") local[key] = NodeToFloat(entry.second, variables);
     last.reset(entry.second);
     empty = false;
   }
-  if (empty) throwInvalidNode();
+  if (empty) Yaml::throwInvalidNode();
   return evaluateResult(last, local);
 }
 
 }  // namespace
 
 float EvaluateNode(const YAML::Node &node, const VariableTable &variables) {
-  requireValid(node);
-  if (isNull(node)) throw Loader::Exception(node.Mark(), "expected scalar or mapping");
+  Yaml::requireValid(node);
+  if (Yaml::isNull(node)) throw Loader::Exception(node.Mark(), "expected scalar or mapping");
   if (node.IsScalar()) return evaluateScalar(node, variables);
   if (node.IsMap()) return evaluateMapping(node, variables);
   throw Loader::Exception(node.Mark(), "expected scalar or mapping");

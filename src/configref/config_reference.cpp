@@ -8,18 +8,18 @@
 #include <string>
 
 #include "calc/tagged_value.h"
-#include "calc/yaml_node.h"
-#include "loader/exception.h"
 #include "platform/kestrel_config_store.h"
+#include "yaml/exception.h"
+#include "yaml/node.h"
 
 namespace {
 
-using Calc::scalarText;
 using KestrelConfigStore::ConfigStore;
 using KestrelConfigStore::ConfigStoreException;
 using KestrelConfigStore::ConfigStoreObjectId;
 using KestrelConfigStore::InvalidTypeException;
 using KestrelConfigStore::StoreObject;
+using Yaml::scalarText;
 
 template <typename Value>
 struct Reference {
@@ -52,8 +52,8 @@ void readObjectMapping(const YAML::Node &node, ConfigStoreObjectId &id) {
 
 // Fields that the node does not give keep what they hold.
 void readObject(const YAML::Node &node, ConfigStoreObjectId &id) {
-  Calc::requireValid(node);
-  if (!node.IsDefined() || Calc::isNull(node)) return;
+  Yaml::requireValid(node);
+  if (!node.IsDefined() || Yaml::isNull(node)) return;
   if (node.IsScalar()) {
     throw Loader::Exception(node.Mark(), "invalid config object specification");
   }
@@ -66,7 +66,7 @@ void readObject(const YAML::Node &node, ConfigStoreObjectId &id) {
 
 template <typename Value, typename Convert>
 Reference<Value> readReference(const YAML::Node &node, Convert convertDefault) {
-  Calc::requireValid(node);
+  Yaml::requireValid(node);
   if (!node.IsDefined() || !node.IsMap()) {
     throw Loader::Exception(node.Mark(), "invalid config specification");
   }

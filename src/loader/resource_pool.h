@@ -6,7 +6,9 @@
 
 #include <cstddef>
 #include <string>
+#include <vector>
 
+#include "calc/variable_table.h"
 #include "sched/allocation.h"
 
 namespace Loader {
@@ -18,11 +20,17 @@ struct ResourcePoolImpl {
   // fault, the yaml library's errors, and whatever the conversion of a value throws.
   explicit ResourcePoolImpl(const YAML::Node &item);
 
+  // The same with the facts of another machine; asks no kernel.
+  ResourcePoolImpl(const YAML::Node &item, const Calc::VariableTable &facts);
+
   std::string name;  // the full group path; begins with "host/"
   bool isEnabled = true;
   Sched::MemAllocation mem;
   Sched::CpuAllocation cpu;
 };
+
+// The keys that a definition may have, in the order in which they are compared.
+std::vector<std::string> poolKeys();
 
 static_assert(offsetof(ResourcePoolImpl, isEnabled) == sizeof(std::string));
 static_assert(offsetof(ResourcePoolImpl, mem) == sizeof(std::string) + 1);

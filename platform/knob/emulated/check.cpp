@@ -23,7 +23,7 @@ using Platform::Statement;
 struct Group {
   GroupId parent = 0;
   std::string name, path;
-  Level memory, cpu;
+  ResourceState memory, cpu;
   MemoryStatistics peaks;
 };
 
@@ -62,8 +62,8 @@ class Checker {
       group.parent = run.integer(1);
       group.name = run.text(2);
       const GroupId id = run.integer(0);
-      group.memory = store_.read(id, Resource::kMemory)->level;
-      group.cpu = store_.read(id, Resource::kCpu)->level;
+      group.memory = store_.read(id, Resource::kMemory)->state;
+      group.cpu = store_.read(id, Resource::kCpu)->state;
       group.peaks = store_.read(id, Resource::kMemory)->peaks;
       if (id != kHostId) children_[group.parent].push_back(id);
       groups_.emplace(id, std::move(group));
@@ -107,17 +107,17 @@ class Checker {
     report(group.path, "a peak is below what is reserved now");
   }
 
-  void checkSum(GroupId id, Resource resource, const std::string &name, Level &level) {
+  void checkSum(GroupId id, Resource resource, const std::string &name, ResourceState &state) {
     int64_t sum = 0;
     for (GroupId child : children_[id]) {
       const Group &group = groups_[child];
       sum += reservationOf(resource == Resource::kMemory ? group.memory : group.cpu);
     }
-    if (sum == level.childrenSum) return;
+    if (sum == state.childrenSum) return;
     if (repair_) store_.writeChildrenSum(id, resource, sum);
     report(groups_[id].path, "the children reserve " + std::to_string(sum) + " of " + name +
-                                 ", the group counts " + std::to_string(level.childrenSum));
-    level.childrenSum = sum;
+                                 ", the group counts " + std::to_string(state.childrenSum));
+    state.childrenSum = sum;
   }
 
   void checkMembers() {

@@ -89,8 +89,8 @@ std::optional<ResourceRow> GroupStore::read(GroupId id, Resource resource) {
   if (!run.step()) return std::nullopt;
   ResourceRow row;
   row.parent = run.integer(0);
-  row.level.allocation = {run.integer(1), run.integer(2), run.integer(3), run.integer(4)};
-  row.level.childrenSum = run.integer(5);
+  row.state.allocation = {run.integer(1), run.integer(2), run.integer(3), run.integer(4)};
+  row.state.childrenSum = run.integer(5);
   row.peaks = {static_cast<uint64_t>(run.integer(6)), static_cast<uint64_t>(run.integer(7))};
   return row;
 }

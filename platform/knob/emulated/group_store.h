@@ -17,7 +17,7 @@ namespace Knob {
 // A group's columns of one resource, and who is above it.
 struct ResourceRow {
   GroupId parent = 0;
-  Level level;
+  ResourceState state;
   MemoryStatistics peaks;  // of memory, whatever the resource
 };
 

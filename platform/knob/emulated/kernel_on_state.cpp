@@ -124,17 +124,17 @@ void KernelOnState::remove(GroupId id) {
 }
 
 Allocation KernelOnState::readAllocation(GroupId id, Resource resource) {
-  return alone([&] { return require(id, resource).level.allocation; });
+  return alone([&] { return require(id, resource).state.allocation; });
 }
 
 void KernelOnState::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
   transact(Kind::kWrite, [&] {
     const ResourceRow row = require(id, resource);
-    const Allocation wanted = changedAllocation(row.level.allocation, change);
+    const Allocation wanted = changedAllocation(row.state.allocation, change);
     reserve(id, resource, row, wanted);
     if (resource == Resource::kMemory) {
       if (change.max && wanted.max != -1) requireMemoryFor(id, wanted.max);
-      const MemoryStatistics peaks = raisedPeaks(row.peaks, wanted.min, row.level.childrenSum);
+      const MemoryStatistics peaks = raisedPeaks(row.peaks, wanted.min, row.state.childrenSum);
       if (peaks.ownReservedPeakKB != row.peaks.ownReservedPeakKB) store().writePeaks(id, peaks);
     }
     store().writeAllocation(id, resource, wanted);
@@ -197,8 +197,8 @@ BuildSignature KernelOnState::signature() {
 
 GroupView KernelOnState::view(GroupId id) {
   return transact(Kind::kRead, [&] {
-    const Level memory = require(id, Resource::kMemory).level;
-    const Level cpu = require(id, Resource::kCpu).level;
+    const ResourceState memory = require(id, Resource::kMemory).state;
+    const ResourceState cpu = require(id, Resource::kCpu).state;
     GroupView view;
     view.id = id;
     view.name = store().nameOf(id);
@@ -224,29 +224,29 @@ ResourceRow KernelOnState::require(GroupId id, Resource resource) {
 
 void KernelOnState::reserve(GroupId id, Resource resource, const ResourceRow &row,
                             const Allocation &wanted) {
-  std::vector<Level> levels = {row.level};
+  std::vector<ResourceState> states = {row.state};
   std::vector<GroupId> ids = {id};
   std::vector<MemoryStatistics> peaks = {row.peaks};
 
   // Where the group's own reservation stays, nothing above it can change.
-  const bool changes = reservationOf({wanted, row.level.childrenSum}) != reservationOf(row.level);
+  const bool changes = reservationOf({wanted, row.state.childrenSum}) != reservationOf(row.state);
   for (GroupId above = row.parent; changes && above != 0;) {
     const ResourceRow aboveRow = require(above, resource);
-    levels.push_back(aboveRow.level);
+    states.push_back(aboveRow.state);
     ids.push_back(above);
     peaks.push_back(aboveRow.peaks);
     above = aboveRow.parent;
   }
 
   const int64_t capacity = changes ? machineCapacity(store().facts(maxVms_), resource) : 0;
-  const auto admitted = admit(levels, wanted, capacity);
+  const auto admitted = admit(states, wanted, capacity);
   if (!admitted) throw KernelError(Status::kReservationRefused);
 
   for (size_t i = 1; i < admitted->size(); ++i) {
-    const Level &level = (*admitted)[i];
-    store().writeChildrenSum(ids[i], resource, level.childrenSum);
+    const ResourceState &state = (*admitted)[i];
+    store().writeChildrenSum(ids[i], resource, state.childrenSum);
     if (resource == Resource::kMemory) {
-      const auto raised = raisedPeaks(peaks[i], level.allocation.min, level.childrenSum);
+      const auto raised = raisedPeaks(peaks[i], state.allocation.min, state.childrenSum);
       if (raised.childrenReservedPeakKB != peaks[i].childrenReservedPeakKB) {
         store().writePeaks(ids[i], raised);
       }
@@ -277,7 +277,7 @@ bool KernelOnState::isBelow(GroupId id, GroupId ancestor) {
 void KernelOnState::requireAnyMemory(GroupId id) {
   for (ResourceRow row; id != 0; id = row.parent) {
     row = require(id, Resource::kMemory);
-    if (row.level.allocation.max == 0) {
+    if (row.state.allocation.max == 0) {
       throw KernelError(Status::kOutOfMemory, "the group, or one above it, may have no memory");
     }
   }

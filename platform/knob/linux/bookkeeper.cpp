@@ -172,7 +172,7 @@ void Bookkeeper::recordNew(Group &group) noexcept {
 
 void Bookkeeper::changeHeld(Group &group, Held held, Resource resource,
                             const AllocationChange &change) {
-  const Allocation current = held.record.books(resource).allocation;
+  const Allocation current = held.record.state(resource).allocation;
   const Allocation wanted = changedAllocation(current, change);
   if (held.record.savedHigh) restoreMemoryHigh(group, held.record);
   if (areEqual(wanted, current)) return groups_.requireAlive(group);
@@ -189,16 +189,16 @@ bool Bookkeeper::count(Group &group, const Held &held) {
 
 void Bookkeeper::apply(Group &group, const Held &held, Resource resource,
                        const Allocation &wanted) {
-  const Books &books = held.record.books(resource);
+  const ResourceState &books = held.record.state(resource);
   // Without a record nothing above counts the group's minimum yet.
-  const Level own = {held.isStored ? books.allocation : Allocation(), books.childrenSum};
+  const ResourceState own = {held.isStored ? books.allocation : Allocation(), books.childrenSum};
   const int64_t before = reservationOf(own);
   const int64_t after = reservationOf({wanted, own.childrenSum});
   if (after > before && after > machineCapacity(facts_, resource)) refuse("the machine");
   const std::vector<Place> above =
       before == after ? std::vector<Place>()
                       : placesFrom(groups_.parentOf(group), resource, before, after);
-  const std::vector<Level> levels = admitted(own, above, resource, wanted);
+  const std::vector<ResourceState> levels = admitted(own, above, resource, wanted);
 
   Writes writes(groups_);
   if (resource == Resource::kMemory && isLower(wanted.max, books.allocation.max)) {
@@ -213,9 +213,9 @@ void Bookkeeper::apply(Group &group, const Held &held, Resource resource,
 void Bookkeeper::releaseChild(Group &parent, const Held &child) {
   if (!child.isStored) return;
   for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
-    const Books &books = child.record.books(resource);
-    Level own;
-    own.allocation.min = reservationOf({books.allocation, books.childrenSum});
+    const ResourceState &books = child.record.state(resource);
+    ResourceState own;
+    own.allocation.min = reservationOf(books);
     if (own.allocation.min == 0) continue;
     const std::vector<Place> above =
         placesFrom(groups_.find(parent.id), resource, own.allocation.min, 0);
@@ -236,7 +236,7 @@ std::vector<Deviation> Bookkeeper::deviations(Group &group, const Record &record
 std::vector<Deviation> Bookkeeper::compare(Group &group, const Record &record) const {
   std::vector<Deviation> found;
   for (Resource resource : {Resource::kMemory, Resource::kCpu}) {
-    for (const Value &value : valuesOf(resource, record.books(resource), facts_.cpus)) {
+    for (const Value &value : valuesOf(resource, record.state(resource), facts_.cpus)) {
       auto actual = readControlIfAny(group.directory, rowOf(value.control).name);
       if (actual != value.text) found.push_back({value.control, value.text, std::move(actual)});
     }
@@ -251,22 +251,23 @@ std::vector<Bookkeeper::Place> Bookkeeper::placesFrom(GroupPtr group, Resource r
   for (; group; group = groups_.parentOf(*group)) {
     Held held = readToChange(*group);
     if (count(*group, held)) held = readToChange(*group);
-    const Books &books = held.record.books(resource);
+    const ResourceState &books = held.record.state(resource);
     const int64_t sum = saturatedSum(books.childrenSum - before, after);
     places.push_back({group, held});
     if (books.allocation.min >= std::max(sum, books.childrenSum)) break;
-    before = reservationOf({books.allocation, books.childrenSum});
+    before = reservationOf(books);
     after = reservationOf({books.allocation, sum});
   }
   return places;
 }
 
-std::vector<Level> Bookkeeper::admitted(const Level &own, const std::vector<Place> &above,
-                                        Resource resource, const Allocation &wanted) const {
-  std::vector<Level> levels = {own};
+std::vector<ResourceState> Bookkeeper::admitted(const ResourceState &own,
+                                                const std::vector<Place> &above, Resource resource,
+                                                const Allocation &wanted) const {
+  std::vector<ResourceState> levels = {own};
   for (const Place &place : above) {
-    const Books &books = place.held.record.books(resource);
-    levels.push_back({books.allocation, books.childrenSum});
+    const ResourceState &books = place.held.record.state(resource);
+    levels.push_back(books);
   }
   const auto answer = admit(std::move(levels), wanted, machineCapacity(facts_, resource));
   if (!answer) refuse("the group, one above it or the machine");
@@ -288,10 +289,10 @@ void Bookkeeper::writeOwn(Writes &writes, Group &group, const Held &held, Resour
                           const Allocation &wanted) const {
   const bool isNew = !held.isStored && group.unrecordedMax;
   Record after = held.record;
-  after.books(resource).allocation = wanted;
+  after.state(resource).allocation = wanted;
   after.peaks = raisedPeaks(after.peaks, after.memory.allocation.min, after.memory.childrenSum);
-  const Values to = valuesOf(resource, after.books(resource), facts_.cpus);
-  Values from = valuesOf(resource, held.record.books(resource), facts_.cpus);
+  const Values to = valuesOf(resource, after.state(resource), facts_.cpus);
+  Values from = valuesOf(resource, held.record.state(resource), facts_.cpus);
   if (isNew && resource == Resource::kMemory && isMaximumAlone(wanted)) {
     writeControls(writes, group, from, to);
     group.unrecordedMax = wanted.max;
@@ -306,21 +307,21 @@ void Bookkeeper::writeOwn(Writes &writes, Group &group, const Held &held, Resour
 
 // levels: what admission made of the group that changes, then of those places that change.
 void Bookkeeper::writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
-                           const std::vector<Level> &levels) const {
+                           const std::vector<ResourceState> &levels) const {
   const size_t changed = levels.size() - 1;
   const auto writeSum = [&](size_t i) {
     const auto &[group, held] = above[i];
     Record after = held.record;
-    after.books(resource).childrenSum = levels[i + 1].childrenSum;
+    after.state(resource).childrenSum = levels[i + 1].childrenSum;
     after.peaks = raisedPeaks(after.peaks, after.memory.allocation.min, after.memory.childrenSum);
     writes.record(*group, storedIn(held), after);
     // The first value is the one that the reservation shows in.
-    const std::string from = valuesOf(resource, held.record.books(resource), facts_.cpus)[0].text;
-    const Value to = valuesOf(resource, after.books(resource), facts_.cpus)[0];
+    const std::string from = valuesOf(resource, held.record.state(resource), facts_.cpus)[0].text;
+    const Value to = valuesOf(resource, after.state(resource), facts_.cpus)[0];
     writes.control(*group, to.control, from, to.text);
   };
   if (changed == 0) return;
-  const bool grows = levels[1].childrenSum > above[0].held.record.books(resource).childrenSum;
+  const bool grows = levels[1].childrenSum > above[0].held.record.state(resource).childrenSum;
   for (size_t i = 0; i < changed; ++i) writeSum(grows ? changed - 1 - i : i);
 }
 

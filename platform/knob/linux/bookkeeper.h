@@ -74,13 +74,13 @@ class Bookkeeper {
   bool count(Group &group, const Held &held);
   void apply(Group &group, const Held &held, Resource resource, const Allocation &wanted);
   std::vector<Place> placesFrom(GroupPtr group, Resource resource, int64_t before, int64_t after);
-  std::vector<Level> admitted(const Level &own, const std::vector<Place> &above, Resource resource,
-                              const Allocation &wanted) const;
+  std::vector<ResourceState> admitted(const ResourceState &own, const std::vector<Place> &above,
+                                      Resource resource, const Allocation &wanted) const;
   void writeControls(Writes &writes, Group &group, const Values &from, const Values &to) const;
   void writeOwn(Writes &writes, Group &group, const Held &held, Resource resource,
                 const Allocation &wanted) const;
   void writeSums(Writes &writes, const std::vector<Place> &above, Resource resource,
-                 const std::vector<Level> &levels) const;
+                 const std::vector<ResourceState> &levels) const;
 
   Groups &groups_;
   const HostFacts &facts_;

@@ -20,8 +20,8 @@ uint64_t limitIn(const Group &group, Control control) {
 
 }  // namespace
 
-Values valuesOf(Resource resource, const Books &books, uint32_t cpus) {
-  const int64_t reservation = reservationOf({books.allocation, books.childrenSum});
+Values valuesOf(Resource resource, const ResourceState &books, uint32_t cpus) {
+  const int64_t reservation = reservationOf(books);
   const Allocation &allocation = books.allocation;
   if (resource == Resource::kMemory) {
     return {Value{Control::kMemoryMin, memoryText(reservation)},

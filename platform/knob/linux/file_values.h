@@ -21,7 +21,7 @@ struct Value {
 using Values = std::array<Value, 2>;
 
 // cpus: of the machine.
-Values valuesOf(Resource resource, const Books &books, uint32_t cpus);
+Values valuesOf(Resource resource, const ResourceState &books, uint32_t cpus);
 
 // The nearest that our settings can express. No file tells a CPU minimum. Throws KernelError.
 Record readFiles(const Group &group);

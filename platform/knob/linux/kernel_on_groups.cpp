@@ -105,7 +105,7 @@ Allocation KernelOnGroups::readAllocation(GroupId id, Resource resource) {
   const GroupPtr group = find(id);
   const Held held = books_.read(*group);
   groups_.requireAlive(*group);  // a directory keeps its attributes when it is gone
-  return held.record.books(resource).allocation;
+  return held.record.state(resource).allocation;
 }
 
 void KernelOnGroups::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
@@ -190,8 +190,8 @@ GroupView KernelOnGroups::view(GroupId id) {
   view.name = groups_.nameOf(*group);
   view.memory = held.record.memory.allocation;
   view.cpu = held.record.cpu.allocation;
-  view.memoryReservationMB = reservationOf({view.memory, held.record.memory.childrenSum});
-  view.cpuReservationPercent = reservationOf({view.cpu, held.record.cpu.childrenSum});
+  view.memoryReservationMB = reservationOf(held.record.memory);
+  view.cpuReservationPercent = reservationOf(held.record.cpu);
   if (const auto bytes = readControlIfAny(group->directory, kMemoryCurrentFile)) {
     view.usage.memoryBytes = parseLimit(*bytes);
   }

@@ -46,8 +46,8 @@ LinuxHost lookAt(const Configuration &configuration) {
   if (!group) return host;
   HostFacts unused;
   const Linux::Held held = Linux::Bookkeeper(groups, unused).read(*group);
-  const Linux::Books &memory = held.record.memory;
-  const int64_t promised = reservationOf({memory.allocation, memory.childrenSum});
+  const ResourceState &memory = held.record.memory;
+  const int64_t promised = reservationOf(memory);
   for (std::string &text : Linux::unprotectedAbove(groups, promised)) {
     host.problems.push_back(std::move(text));
   }

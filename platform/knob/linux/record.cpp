@@ -14,31 +14,31 @@ constexpr uint32_t kVersion = 1;
 constexpr uint32_t kHasSavedHigh = 1;
 
 #pragma pack(push, 1)
-struct PackedBooks {
+struct PackedState {
   int64_t min, max, minLimit, shares, childrenSum;
 };
 struct Packed {
   uint32_t version, flags;
-  PackedBooks memory, cpu;
+  PackedState memory, cpu;
   uint64_t ownPeakKB, childrenPeakKB, savedHigh;
 };
 #pragma pack(pop)
-static_assert(sizeof(PackedBooks) == 40 && sizeof(Packed) == kRecordSize);
+static_assert(sizeof(PackedState) == 40 && sizeof(Packed) == kRecordSize);
 static_assert(offsetof(Packed, memory) == 8 && offsetof(Packed, cpu) == 48 &&
               offsetof(Packed, ownPeakKB) == 88 && offsetof(Packed, savedHigh) == 104);
 
-PackedBooks packed(const Books &books) {
+PackedState packed(const ResourceState &books) {
   const Allocation &allocation = books.allocation;
   return {allocation.min, allocation.max, allocation.minLimit, allocation.shares,
           books.childrenSum};
 }
 
-Books unpacked(const PackedBooks &from) {
+ResourceState unpacked(const PackedState &from) {
   return {{from.min, from.max, from.minLimit, from.shares}, from.childrenSum};
 }
 
 // An allocation that a set would refuse is none that a set has written.
-bool isSound(const Books &books) {
+bool isSound(const ResourceState &books) {
   try {
     (void)changedAllocation(books.allocation, {});
     return books.childrenSum >= 0;

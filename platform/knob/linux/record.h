@@ -9,6 +9,7 @@
 #include <optional>
 #include <string_view>
 
+#include "knob/admission.h"
 #include "knob/kernel.h"
 
 namespace Knob::Linux {
@@ -17,20 +18,15 @@ inline constexpr const char *kRecordAttribute = "user.knob";
 // Of host alone: the library that made it, "MD5 BUILDDATE".
 inline constexpr const char *kLibraryAttribute = "user.knob.library";
 
-struct Books {
-  Allocation allocation;
-  int64_t childrenSum = 0;  // of the children's reservations
-};
-
 struct Record {
-  Books memory, cpu;
+  ResourceState memory, cpu;
   MemoryStatistics peaks;
   // The text of memory.high while it is lowered to make a smaller maximum possible: bytes, or
   // kUnlimited. Whoever finds it there puts it back: the one who lowered it has died.
   std::optional<uint64_t> savedHigh;
 
-  Books &books(Resource resource) { return resource == Resource::kMemory ? memory : cpu; }
-  const Books &books(Resource resource) const {
+  ResourceState &state(Resource resource) { return resource == Resource::kMemory ? memory : cpu; }
+  const ResourceState &state(Resource resource) const {
     return resource == Resource::kMemory ? memory : cpu;
   }
 };

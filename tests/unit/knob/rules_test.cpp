@@ -75,26 +75,26 @@ TEST(Settings, ARefusalSaysWhichEntryAndWhy) {
 
 constexpr int64_t kMost = INT64_MAX;
 
-Level level(int64_t min, int64_t max, int64_t minLimit, int64_t childrenSum) {
+ResourceState state(int64_t min, int64_t max, int64_t minLimit, int64_t childrenSum) {
   return {{min, max, minLimit, -3}, childrenSum};
 }
 
-std::optional<std::vector<int64_t>> sumsAfter(std::vector<Level> levels, int64_t wantedMin,
+std::optional<std::vector<int64_t>> sumsAfter(std::vector<ResourceState> states, int64_t wantedMin,
                                               int64_t capacity) {
-  Allocation wanted = levels.front().allocation;
+  Allocation wanted = states.front().allocation;
   wanted.min = wantedMin;
-  const auto admitted = admit(std::move(levels), wanted, capacity);
+  const auto admitted = admit(std::move(states), wanted, capacity);
   if (!admitted) return std::nullopt;
   std::vector<int64_t> sums;
-  for (const Level &each : *admitted) sums.push_back(each.childrenSum);
+  for (const ResourceState &each : *admitted) sums.push_back(each.childrenSum);
   return sums;
 }
 
 using Sums = std::vector<int64_t>;
 
 TEST(Admission, TheLargerOfOwnMinAndChildrenIsReserved) {
-  EXPECT_EQ(reservationOf(level(5, -1, -1, 3)), 5);
-  EXPECT_EQ(reservationOf(level(3, -1, -1, 5)), 5);
+  EXPECT_EQ(reservationOf(state(5, -1, -1, 3)), 5);
+  EXPECT_EQ(reservationOf(state(3, -1, -1, 5)), 5);
 }
 
 TEST(Admission, TheMachineHas100PercentForEachCpuAndItsWholeMegabytes) {
@@ -110,37 +110,37 @@ TEST(Admission, TheMachineHas100PercentForEachCpuAndItsWholeMegabytes) {
 }
 
 TEST(Admission, EveryLevelAboveCountsTheChange) {
-  EXPECT_EQ(sumsAfter({level(2, -1, -1, 0), level(0, -1, -1, 10), level(0, -1, -1, 30)}, 5, 100),
+  EXPECT_EQ(sumsAfter({state(2, -1, -1, 0), state(0, -1, -1, 10), state(0, -1, -1, 30)}, 5, 100),
             (Sums{0, 13, 33}));
 }
 
 TEST(Admission, ItEndsWhereALevelsOwnMinCoversTheChange) {
-  EXPECT_EQ(sumsAfter({level(2, -1, -1, 0), level(50, -1, -1, 10), level(0, -1, -1, 60)}, 5, 100),
+  EXPECT_EQ(sumsAfter({state(2, -1, -1, 0), state(50, -1, -1, 10), state(0, -1, -1, 60)}, 5, 100),
             (Sums{0, 13}));
 }
 
 TEST(Admission, AnUnchangedReservationTouchesNothingAbove) {
-  EXPECT_EQ(sumsAfter({level(2, -1, -1, 20), level(0, -1, -1, 20)}, 7, 1), (Sums{20}));
+  EXPECT_EQ(sumsAfter({state(2, -1, -1, 20), state(0, -1, -1, 20)}, 7, 1), (Sums{20}));
 }
 
 TEST(Admission, ShrinkingIsAlwaysAdmitted) {
   // A machine that lost memory, and a parent whose limit is below what it holds.
-  EXPECT_EQ(sumsAfter({level(50, -1, -1, 0), level(0, 10, 10, 90)}, 40, 20), (Sums{0, 80}));
+  EXPECT_EQ(sumsAfter({state(50, -1, -1, 0), state(0, 10, 10, 90)}, 40, 20), (Sums{0, 80}));
 }
 
 TEST(Admission, SumsSaturate) {
-  EXPECT_EQ(sumsAfter({level(1, -1, -1, 0), level(0, -1, -1, 10)}, kMost, 100), std::nullopt);
-  EXPECT_EQ(sumsAfter({level(1, -1, -1, 0), level(0, -1, -1, 10)}, kMost, kMost), (Sums{0, kMost}));
+  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMost, 100), std::nullopt);
+  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMost, kMost), (Sums{0, kMost}));
 }
 
 TEST(Admission, EachLimitRefusesOneAboveIt) {
-  EXPECT_TRUE(sumsAfter({level(0, 5, -1, 0)}, 5, 100));
-  EXPECT_FALSE(sumsAfter({level(0, 5, -1, 0)}, 6, 100));
-  EXPECT_FALSE(sumsAfter({level(0, -1, 5, 0)}, 6, 100));
-  EXPECT_FALSE(sumsAfter({level(0, -1, -1, 0), level(0, 5, -1, 0)}, 6, 100));
-  EXPECT_FALSE(sumsAfter({level(0, -1, -1, 0), level(0, -1, 5, 0)}, 6, 100));
-  EXPECT_TRUE(sumsAfter({level(0, -1, -1, 0), level(0, -1, -1, 0)}, 100, 100));
-  EXPECT_FALSE(sumsAfter({level(0, -1, -1, 0), level(0, -1, -1, 0)}, 101, 100));
+  EXPECT_TRUE(sumsAfter({state(0, 5, -1, 0)}, 5, 100));
+  EXPECT_FALSE(sumsAfter({state(0, 5, -1, 0)}, 6, 100));
+  EXPECT_FALSE(sumsAfter({state(0, -1, 5, 0)}, 6, 100));
+  EXPECT_FALSE(sumsAfter({state(0, -1, -1, 0), state(0, 5, -1, 0)}, 6, 100));
+  EXPECT_FALSE(sumsAfter({state(0, -1, -1, 0), state(0, -1, 5, 0)}, 6, 100));
+  EXPECT_TRUE(sumsAfter({state(0, -1, -1, 0), state(0, -1, -1, 0)}, 100, 100));
+  EXPECT_FALSE(sumsAfter({state(0, -1, -1, 0), state(0, -1, -1, 0)}, 101, 100));
 }
 
 TEST(Peaks, MegabytesBecomeKilobytesAndSaturate) {

@@ -13,9 +13,9 @@
 #include <typeinfo>
 #include <vector>
 
-#include "loader/exception.h"
 #include "loader/file_error.h"
 #include "temp_folder.h"
+#include "yaml/exception.h"
 #include "yaml_support.h"
 
 // A leak checker's, where there is one.

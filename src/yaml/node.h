@@ -1,13 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// How values are taken out of YAML nodes. The yaml library's releases differ in what they call a
-// null and in some of their texts; here every release gives the same answer.
+// Reads values from YAML nodes. Releases of the yaml library differ in which nodes are null and in
+// some error texts; these functions give the same result with every release.
 #pragma once
 
 #include <yaml-cpp/yaml.h>
 
 #include <string>
 
-namespace Calc {
+namespace Yaml {
 
 // Throws the yaml library's plain invalid-node error, which never names a key.
 [[noreturn]] void throwInvalidNode();
@@ -25,4 +25,4 @@ std::string tagOf(const YAML::Node &node);
 // not a scalar; a null has no text.
 std::string scalarText(const YAML::Node &node);
 
-}  // namespace Calc
+}  // namespace Yaml

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The error of a definition that knows its place in the file. Whatever reads definitions throws
-// it; the mark and the bare message stay readable (`mark`, `msg`).
+// The error of a definition that knows its place in the file. It is below the loader because every
+// room that reads definitions throws it. The mark and the bare message stay readable (`mark`,
+// `msg`).
 #pragma once
 
 #include <yaml-cpp/exceptions.h>

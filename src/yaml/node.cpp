@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// Levels out the differences between releases of the yaml library.
-#include "calc/yaml_node.h"
+// Hides the differences between releases of the yaml library.
+#include "yaml/node.h"
 
 #include <type_traits>
 
-namespace Calc {
+namespace Yaml {
 namespace {
 
 // Older releases build the error from nothing, newer ones from the key that was asked for.
@@ -64,4 +64,4 @@ std::string scalarText(const YAML::Node &node) {
   return node.Scalar();
 }
 
-}  // namespace Calc
+}  // namespace Yaml
