@@ -99,6 +99,10 @@ class Backend {
   // Replaces the objects of the same ids, with all their fields. Other objects stay. All or none.
   virtual void replace(const std::vector<StoredObject> &objects) = 0;
 
+  // Moves an object from one layer to another in one transaction: its fields replace those of the
+  // same names there, and it is deleted here. false: the first layer does not have it.
+  virtual bool move(const ObjectId &id, const std::string &from, const std::string &to) = 0;
+
   // Inspects the store. May throw when the store cannot be read at all.
   virtual Health health() = 0;
 

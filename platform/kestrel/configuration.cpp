@@ -121,6 +121,9 @@ std::string expanded(const Platform::KeyValueFile &file, const std::string &pref
       result += names.host;
     } else if (letter == 'L') {
       if (names.label.empty()) file.refuse("prefix", "%L needs \"label\"");
+      if (!isPathPart(names.label)) {
+        file.refuse("prefix", "%L: the label \"" + names.label + "\" cannot be part of a key");
+      }
       result += names.label;
     } else {
       file.refuse("prefix", "bad value \"" + prefix + "\" (after '%' only H, L or %)");
@@ -176,13 +179,16 @@ void refusePasswordInClear(const Platform::KeyValueFile &file, const Configurati
   }
 }
 
-HostNames hostNames(const Platform::KeyValueFile &file, const HostNames *names) {
-  if (names != nullptr) return *names;
-  HostNames own{hostName(), file.text("label").value_or("")};
-  if (!own.label.empty() && !isPathPart(own.label)) {
-    file.refuse("label", "bad value \"" + own.label + "\" (letters, digits, '-', '.' and '_')");
+// This host's names, unless others are given. The label of another host is not known from here.
+HostNames hostNames(const Platform::KeyValueFile &file, const HostNames *given) {
+  HostNames names{hostName(), file.text("label").value_or("")};
+  if (!names.label.empty() && !isPathPart(names.label)) {
+    file.refuse("label", "bad value \"" + names.label + "\" (letters, digits, '-', '.' and '_')");
   }
-  return own;
+  if (given == nullptr) return names;
+  if (!given->host.empty()) return *given;
+  if (!given->label.empty()) names.label = given->label;
+  return names;
 }
 
 void readEtcd(const Platform::KeyValueFile &file, const HostNames &names, Configuration *result) {

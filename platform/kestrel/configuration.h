@@ -33,8 +33,8 @@ struct Configuration {
 
 // What %H and %L in "prefix" become.
 struct HostNames {
-  std::string host;
-  std::string label;  // empty: none
+  std::string host;   // empty: this host
+  std::string label;  // empty: none; for this host, the file's
 };
 
 // The configuration file's path. KESTREL_CONF is ignored in a process that got its rights from its
@@ -42,7 +42,7 @@ struct HostNames {
 std::string configurationFile();
 
 // The default file is allowed to be missing, one that KESTREL_CONF names is not. names: the host to
-// read it for; without it, this host with the file's own label.
+// read it for; null: this one.
 Configuration readConfiguration(const HostNames *names = nullptr);
 
 }  // namespace Kestrel

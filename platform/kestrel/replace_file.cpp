@@ -1,10 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// A scratch file beside the file has a name of its own for each process.
+// The scratch file beside the file has a name of its own for each process and each call.
 #include "kestrel/replace_file.h"
 
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cerrno>
 #include <cstdio>
 #include <system_error>
@@ -31,7 +32,9 @@ void writeAll(int fd, std::string_view text) {
 }
 
 void replaceFile(const std::string &path, std::string_view text, mode_t mode) {
-  const std::string scratch = path + ".new-" + std::to_string(getpid());
+  static std::atomic<unsigned> calls{0};
+  const std::string scratch =
+      path + ".new-" + std::to_string(getpid()) + "-" + std::to_string(++calls);
   (void)unlink(scratch.c_str());  // left by a process of the same number that was killed
   const Platform::UniqueFd fd(
       open(scratch.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, mode));

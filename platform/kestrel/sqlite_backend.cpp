@@ -102,6 +102,10 @@ class SqliteBackend : public Backend {
     change([&](Database &database) { replaceObjects(database, objects); });
   }
 
+  bool move(const ObjectId &, const std::string &, const std::string &) override {
+    throw storeError(path_, "an SQLite store has no layers");
+  }
+
   Health health() override {
     Health health;
     consistently([&] { health.details = describeTables(session_->file.database()); });

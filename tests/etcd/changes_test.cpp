@@ -206,6 +206,45 @@ TEST_F(EtcdChanges, WritersAtTheSameTimeLoseNothing) {
   EXPECT_EQ(fields->size(), kWriters * kFields / 2);
 }
 
+TEST_F(EtcdChanges, AMoveIsOneTransactionBetweenLayers) {
+  etcd_.etcdctl({"put", "/kestrel/canary/global/host/pools/backup"}, R"({"a":2,"b":2})");
+  put("host/pools/backup", R"({"a":1,"c":1})");
+  const auto run = store();
+  EXPECT_TRUE(run->move(id_, "/kestrel/canary", "/kestrel"));
+  EXPECT_EQ(run->read(id_), (Fields{{"a", int64_t{2}}, {"b", int64_t{2}}, {"c", int64_t{1}}}));
+  EXPECT_EQ(etcd_.etcdctl({"get", "--prefix", "/kestrel/canary/"}), "");
+  EXPECT_FALSE(run->move(id_, "/kestrel/canary", "/kestrel"));
+}
+
+TEST_F(EtcdChanges, MovesAndWritersAtTheSameTimeLoseNothing) {
+  constexpr int kRounds = 30;
+  auto canary = etcd_.configuration();
+  canary.prefixes = {"/kestrel/canary"};
+  std::thread writer([&] {
+    const auto layer = Kestrel::Etcd::openEtcdBackend(canary);
+    for (int i = 0; i < kRounds; ++i) layer->setField(id_, "n" + std::to_string(i), int64_t{i});
+  });
+  const auto mover = store();
+  for (int i = 0; i < kRounds; ++i) (void)mover->move(id_, "/kestrel/canary", "/kestrel");
+  writer.join();
+  (void)mover->move(id_, "/kestrel/canary", "/kestrel");
+  EXPECT_EQ(store()->read(id_)->size(), size_t{kRounds});
+}
+
+TEST_F(EtcdChanges, ALayerMustBeChosenWhereThereAreSeveral) {
+  auto configuration = etcd_.configuration();
+  configuration.prefixes = {"/kestrel/canary", "/kestrel"};
+  const auto layered = Kestrel::Etcd::openEtcdBackend(configuration);
+  for (const std::function<void()> &action :
+       {std::function<void()>([&] { layered->setField(id_, "n", int64_t{1}); }),
+        std::function<void()>([&] { (void)layered->removeObject(id_); }),
+        std::function<void()>([&] { (void)layered->list({}); }), std::function<void()>([&] {
+          layered->replace({{id_, {}}});
+        })}) {
+    EXPECT_THAT(refusalOf(action), HasSubstr("one of them must be chosen"));
+  }
+}
+
 TEST_F(EtcdChanges, AFullServerRefusesWithItsLimitNamed) {
   etcd_.member(0).kill();
   TempFolder folder;

@@ -226,27 +226,29 @@ TEST(JsonTree, EveryKindIsRead) {
 }
 
 TEST(Protocol, AChangeComparesTheRevision) {
-  EXPECT_EQ(changeText({"k", 4, "v"}),
+  EXPECT_EQ(changeText({{"k", 4, "v"}}),
             R"({"compare":[{"key":"aw==","target":"MOD","result":"EQUAL","mod_revision":"4"}],)"
             R"("success":[{"request_put":{"key":"aw==","value":"dg=="}}],)"
             R"("failure":[{"request_range":{"key":"aw=="}}]})");
-  EXPECT_THAT(changeText({"k", 4, std::nullopt}),
+  EXPECT_THAT(changeText({{"k", 4, std::nullopt}}),
               HasSubstr(R"("success":[{"request_delete_range":{"key":"aw=="}}])"));
 }
 
 TEST(Protocol, AChangeThatWasNotMadeReturnsWhatTheKeyHolds) {
-  const auto done = readChange(R"({"header":{},"succeeded":true,"responses":[{}]})");
+  const auto done = readChange(1, R"({"header":{},"succeeded":true,"responses":[{}]})");
   EXPECT_TRUE(done.done);
-  const auto gone = readChange(R"({"header":{},"responses":[{"response_range":{}}]})");
+  const auto gone = readChange(1, R"({"header":{},"responses":[{"response_range":{}}]})");
   EXPECT_FALSE(gone.done);
-  EXPECT_FALSE(gone.found);
+  ASSERT_EQ(gone.found.size(), 1U);
+  EXPECT_FALSE(gone.found[0]);
   const auto other = readChange(
+      1,
       R"({"header":{},"responses":[{"response_range":{"kvs":[{"key":"aw==","value":"dg=="}]}}]})");
-  ASSERT_TRUE(other.found);
-  EXPECT_EQ(other.found->value, "v");
-  EXPECT_THROW(readChange(R"({"header":{}})"), ProtocolError);
-  EXPECT_THROW(readChange(R"({"header":{},"responses":[7]})"), ProtocolError);
-  EXPECT_THROW(readChange(R"({"header":{},"responses":[{}]})"), ProtocolError);
+  ASSERT_TRUE(other.found.at(0));
+  EXPECT_EQ(other.found[0]->value, "v");
+  EXPECT_THROW(readChange(1, R"({"header":{}})"), ProtocolError);
+  EXPECT_THROW(readChange(1, R"({"header":{},"responses":[7]})"), ProtocolError);
+  EXPECT_THROW(readChange(1, R"({"header":{},"responses":[{}]})"), ProtocolError);
 }
 
 TEST(Protocol, ATokenThatWouldBreakAHeaderIsRefused) {

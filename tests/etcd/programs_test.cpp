@@ -284,6 +284,51 @@ TEST_F(EtcdPrograms, AnImportBeyondTheServersLimitChangesNothing) {
   EXPECT_EQ(kestrelctl({"list"}), "");
 }
 
+TEST_F(EtcdPrograms, ARolloutGoesFromOneHostToAGroupToAll) {
+  serve();
+  configure("store = etcd\nendpoints = " + etcd_->urls()[0] +
+            "\ntimeout-ms = 20000\nlabel = stable\n"
+            "prefix = /kestrel/host/%H, /kestrel/canary/%L, /kestrel\n");
+  const Arguments object = {"host", "pools", "backup"};
+  const auto with = [&](const std::string &command, const Arguments &more) {
+    Arguments arguments = {command};
+    arguments.insert(arguments.end(), object.begin(), object.end());
+    arguments.insert(arguments.end(), more.begin(), more.end());
+    return arguments;
+  };
+  const Arguments canary = {"sizeMB", "--as", "web17", "--label", "canary"};
+  kestrelctl(with("set", {"sizeMB", "1", "--layer", "/kestrel"}));
+  kestrelctl(with("set", {"sizeMB", "2", "--layer", "/kestrel/host/web17"}));
+  EXPECT_EQ(kestrelctl(with("resolve", canary)), "sizeMB\tinteger\t2\t/kestrel/host/web17\n");
+  EXPECT_EQ(kestrelctl(with("get", {"--origin"})), "sizeMB\tinteger\t1\t/kestrel\n");
+  kestrelctl(with("move", {"--from", "/kestrel/host/web17", "--to", "/kestrel/canary/canary"}));
+  EXPECT_EQ(kestrelctl(with("resolve", canary)), "sizeMB\tinteger\t2\t/kestrel/canary/canary\n");
+  EXPECT_EQ(kestrelctl(with("get", {"sizeMB"})), "1\n");
+  kestrelctl(with("move", {"--from", "/kestrel/canary/canary", "--to", "/kestrel"}));
+  EXPECT_EQ(kestrelctl(with("get", {"sizeMB"})), "2\n");
+  EXPECT_THAT(kestrelctl(with("move", {"--from", "/kestrel/none", "--to", "/kestrel"}), 3),
+              HasSubstr("no such object"));
+  EXPECT_THAT(kestrelctl(with("set", {"sizeMB", "3"}), 1), HasSubstr("must be chosen"));
+  EXPECT_THAT(kestrelctl(with("set", {"sizeMB", "3", "--layer", "x"}), 2), HasSubstr("--layer"));
+  EXPECT_THAT(kestrelctl(with("resolve", {"--as", "web17"}), 1), HasSubstr("%L needs"));
+}
+
+TEST_F(EtcdPrograms, CheckAndKeepGoingShowWhatIsDamagedAndWhatIsNot) {
+  serve();
+  put("host/pools/a", R"({"n": 1})");
+  put("host/pools/b", "garbage");
+  put("c/g", "{}");
+  EXPECT_EQ(kestrelctl({"check"}, 1),
+            "/kestrel/global/c/g: the key is not that of an object\n"
+            "/kestrel/global/host/pools/b: the value is not JSON: unreadable at byte 1\n");
+  EXPECT_THAT(kestrelctl({"list"}, 1), HasSubstr("/kestrel/global/c/g: the key is not that of an "
+                                                 "object (2 damaged in all: see kestrelctl check"));
+  EXPECT_THAT(kestrelctl({"list", "--keep-going"}, 1),
+              AllOf(StartsWith("host\tpools\ta\t\tn\tinteger\t1\n"), HasSubstr("are left out")));
+  EXPECT_THAT(kestrelctl({"export", "--keep-going"}, 1), HasSubstr("key: a\n"));
+  EXPECT_THAT(kestrelctl({"export"}, 1), Not(HasSubstr("key: a\n")));
+}
+
 TEST_F(EtcdPrograms, KestrelctlReportsWhyNoMemberResponds) {
   configure("store = etcd\nendpoints = http://" + freePlace() + "\n");
   for (const Arguments &arguments : {Arguments{"get", "a", "b", "c"},

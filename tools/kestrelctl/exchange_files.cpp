@@ -12,7 +12,8 @@
 
 #include "common/read_file.h"
 #include "common/unique_fd.h"
-#include "kestrel/exchange.h"
+#include "kestrel/exchange_read.h"
+#include "kestrel/exchange_write.h"
 #include "kestrel/replace_file.h"
 #include "shared/tool.h"
 

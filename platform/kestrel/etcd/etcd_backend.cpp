@@ -97,15 +97,26 @@ class EtcdBackend : public Backend {
   }
 
   void setField(const ObjectId &id, const std::string &field, const Value &value) override {
-    change(objectKey(onlyPrefix(), id), [&](Fields *fields) {
-      (*fields)[field] = value;
+    change({objectKey(onlyPrefix(), id)}, [&](std::vector<Fields> *objects) {
+      objects->front()[field] = value;
       return true;
     });
   }
 
   bool removeField(const ObjectId &id, const std::string &field) override {
-    return change(objectKey(onlyPrefix(), id),
-                  [&](Fields *fields) { return fields->erase(field) != 0; });
+    return change({objectKey(onlyPrefix(), id)},
+                  [&](std::vector<Fields> *objects) { return objects->front().erase(field) != 0; });
+  }
+
+  bool move(const ObjectId &id, const std::string &from, const std::string &to) override {
+    return change({objectKey(from, id), objectKey(to, id)}, [](std::vector<Fields> *objects) {
+      Fields &source = objects->front(), &target = objects->back();
+      if (source.empty()) return false;
+      source.merge(target);  // keeps the fields that the source has
+      target = std::move(source);
+      source.clear();
+      return true;
+    });
   }
 
   bool removeObject(const ObjectId &id) override {
@@ -249,31 +260,41 @@ class EtcdBackend : public Backend {
            std::to_string(values.values.size()) + " objects";
   }
 
-  std::optional<KeyValue> present(const std::string &key) {
+  std::vector<std::optional<KeyValue>> present(const std::vector<std::string> &keys) {
     ReadRequest request;
-    request.ranges = {{key, ""}};
+    for (const std::string &key : keys) request.ranges.push_back({key, ""});
     ReadResponse response = readNow(request, Members::kMaxResponseBytes);
-    auto &found = response.ranges.front().found;
-    if (found.empty()) return std::nullopt;
-    return std::move(found.front());
+    std::vector<std::optional<KeyValue>> found;
+    for (FoundRange &range : response.ranges) {
+      found.emplace_back();
+      if (!range.found.empty()) found.back() = std::move(range.found.front());
+    }
+    return found;
   }
 
-  // Compare and swap: makes the change on what the key holds, if no other writer has changed it
-  // since it was read; otherwise begins again with what it holds then. apply: false when there is
-  // nothing to change. An object is deleted with its last field.
+  // Compare and swap: makes the change on what the keys hold, if no other writer has changed them
+  // since they were read; otherwise begins again with what they hold then. apply: false when there
+  // is nothing to change. An object is deleted with its last field.
   template <typename Apply>
-  bool change(const std::string &key, const Apply &apply) {
+  bool change(const std::vector<std::string> &keys, const Apply &apply) {
     const Deadline deadline(kMaxTime);
-    std::optional<KeyValue> found = present(key);
+    std::vector<std::optional<KeyValue>> found = present(keys);
     for (int attempt = 1;; ++attempt) {
-      Fields fields = found ? fieldsOf(found->key, found->value) : Fields{};
-      if (!apply(&fields)) return false;
-      ChangeRequest request{key, found ? found->modRevision : 0, std::nullopt};
-      if (!fields.empty()) request.value = valueOf(key, fields);
-      ChangeResponse response = send(request);
+      std::vector<Fields> objects;
+      for (const auto &pair : found) {
+        objects.push_back(pair ? fieldsOf(pair->key, pair->value) : Fields{});
+      }
+      if (!apply(&objects)) return false;
+      std::vector<KeyChange> changes;
+      for (size_t i = 0; i < keys.size(); ++i) {
+        changes.push_back({keys[i], found[i] ? found[i]->modRevision : 0, std::nullopt});
+        if (!objects[i].empty()) changes.back().value = valueOf(keys[i], objects[i]);
+      }
+      ChangeResponse response = send(changes);
       if (response.done) return true;
       if (attempt == kMaxAttempts || deadline.passed()) {
-        throw storeError(kWhere, key, "other writers keep changing it; nothing was changed");
+        throw storeError(kWhere, keys.front(),
+                         "other writers keep changing it; nothing was changed");
       }
       found = std::move(response.found);
       std::this_thread::sleep_for(pauseAfter(attempt));
@@ -286,11 +307,11 @@ class EtcdBackend : public Backend {
     return Milliseconds(std::uniform_int_distribution<int>(0, longest)(random_));
   }
 
-  ChangeResponse send(const ChangeRequest &request) {
+  ChangeResponse send(const std::vector<KeyChange> &changes) {
     ChangeResponse response;
-    members_.change(kTransactionPath, changeText(request), request.key,
+    members_.change(kTransactionPath, changeText(changes), changes.front().key,
                     [&](const std::string &json) {
-                      response = readChange(json);
+                      response = readChange(changes.size(), json);
                       if (response.done) continueFrom(response.header);
                     });
     return response;

@@ -141,13 +141,22 @@ std::string readText(const ReadRequest &request) {
   return "{\"success\":[" + ranges + "]}";
 }
 
-std::string changeText(const ChangeRequest &request) {
-  const std::string key = "{" + member("key", request.key) + "}";
-  const std::string change = request.value ? putText(request.key, *request.value)
-                                           : "{\"request_delete_range\":" + key + "}";
-  return "{\"compare\":[{" + member("key", request.key) +
-         ",\"target\":\"MOD\",\"result\":\"EQUAL\"," + member("mod_revision", request.modRevision) +
-         "}],\"success\":[" + change + "],\"failure\":[{\"request_range\":" + key + "}]}";
+std::string changeText(const std::vector<KeyChange> &changes) {
+  std::string compares, operations, ranges;
+  const auto append = [](std::string *list, const std::string &entry) {
+    *list += (list->empty() ? "" : ",") + entry;
+  };
+  for (const KeyChange &change : changes) {
+    const std::string key = "{" + member("key", change.key) + "}";
+    append(&compares, "{" + member("key", change.key) +
+                          ",\"target\":\"MOD\",\"result\":\"EQUAL\"," +
+                          member("mod_revision", change.modRevision) + "}");
+    append(&operations, change.value ? putText(change.key, *change.value)
+                                     : "{\"request_delete_range\":" + key + "}");
+    append(&ranges, "{\"request_range\":" + key + "}");
+  }
+  return "{\"compare\":[" + compares + "],\"success\":[" + operations + "],\"failure\":[" + ranges +
+         "]}";
 }
 
 std::string putAllText(const std::vector<KeyValue> &pairs) {
@@ -183,12 +192,14 @@ ReadResponse readResponse(const ReadRequest &request, const std::string &json) {
   return response;
 }
 
-ChangeResponse readChange(const std::string &json) {
+ChangeResponse readChange(size_t changes, const std::string &json) {
   const JsonTree tree = parseObject(json);
-  ChangeResponse response{headerOf(tree), truth(tree, "succeeded"), std::nullopt};
+  ChangeResponse response{headerOf(tree), truth(tree, "succeeded"), {}};
   if (response.done) return response;
-  auto found = std::move(transactionRanges(tree, 1).front().found);
-  if (!found.empty()) response.found = std::move(found.front());
+  for (FoundRange &range : transactionRanges(tree, changes)) {
+    response.found.emplace_back();
+    if (!range.found.empty()) response.found.back() = std::move(range.found.front());
+  }
   return response;
 }
 

@@ -54,18 +54,18 @@ struct ReadResponse {
   std::vector<FoundRange> ranges;  // as many as the request has, in its order
 };
 
-// Puts the value only when the key's last change is still the one that is known. Otherwise the
-// response holds the key's present value. Without a value the key is deleted.
-struct ChangeRequest {
+// The change of one key, for a transaction that is made only when the last change of each of its
+// keys is still the one that is known.
+struct KeyChange {
   std::string key;
-  int64_t modRevision = 0;  // 0: there is no such key
-  std::optional<std::string> value;
+  int64_t modRevision = 0;           // 0: there is no such key
+  std::optional<std::string> value;  // empty: the key is deleted
 };
 
 struct ChangeResponse {
   Header header;
   bool done = false;
-  std::optional<KeyValue> found;  // when not done
+  std::vector<std::optional<KeyValue>> found;  // when not done: what each key holds now
 };
 
 struct StatusResponse {
@@ -83,14 +83,14 @@ struct Refusal {
 
 const char *readPath(const ReadRequest &request);
 std::string readText(const ReadRequest &request);
-std::string changeText(const ChangeRequest &request);
+std::string changeText(const std::vector<KeyChange> &changes);
 std::string putAllText(const std::vector<KeyValue> &pairs);  // one transaction without conditions
 std::string deleteText(const std::string &key);
 std::string authenticateText(const std::string &user, const std::string &password);
 
 // All throw ProtocolError. readResponse() also refuses keys that were not asked for.
 ReadResponse readResponse(const ReadRequest &request, const std::string &json);
-ChangeResponse readChange(const std::string &json);
+ChangeResponse readChange(size_t changes, const std::string &json);
 Header readHeader(const std::string &json);
 int64_t readDeleted(const std::string &json);
 std::string readToken(const std::string &json);

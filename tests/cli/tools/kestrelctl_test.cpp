@@ -316,6 +316,17 @@ TEST_F(Kestrelctl, StatusTellsWhyAStoreCannotBeUsed) {
   EXPECT_THAT(result.err, HasSubstr("the file is damaged"));
 }
 
+TEST_F(Kestrelctl, AnSqliteStoreHasNoLayers) {
+  set("x", "1");
+  EXPECT_EQ(err(2, {"get", "host", "pools", "backup", "--layer", "/kestrel"}),
+            "kestrelctl: --layer: an SQLite store has no layers\n");
+  EXPECT_EQ(err(1, {"move", "host", "pools", "backup", "--from", "/a", "--to", "/b"}),
+            "kestrelctl: FOLDER/store.db: an SQLite store has no layers\n");
+  EXPECT_EQ(withoutFolder(out({"get", "host", "pools", "backup", "--origin"}), world_),
+            "x\tinteger\t1\tFOLDER/store.db\n");
+  EXPECT_EQ(out({"check"}), "");
+}
+
 TEST_F(Kestrelctl, ABadConfigurationIsNamedWithItsLineByEveryCommand) {
   writeFile(path("kestrel.conf"), "store = sqlite\nspeed = high\n");
   writeFile(path("in.yaml"), "[]\n");

@@ -19,6 +19,9 @@ class Echo : public Kestrel::Backend {
   bool removeField(const Kestrel::ObjectId &, const std::string &) override { refuse(); }
   bool removeObject(const Kestrel::ObjectId &) override { refuse(); }
   void replace(const std::vector<Kestrel::StoredObject> &) override { refuse(); }
+  bool move(const Kestrel::ObjectId &, const std::string &, const std::string &) override {
+    refuse();
+  }
   Kestrel::Health health() override { return {}; }
   std::vector<Kestrel::LayerFields> layers(const Kestrel::ObjectId &) override { return {}; }
   Kestrel::RunSource source() const override { return {}; }

@@ -2,7 +2,11 @@
 // The SQLite file: files that are not a store or a damaged one, what the tables themselves refuse,
 // and the changes.
 #include <gmock/gmock.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <csignal>
 #include <fstream>
 
 #include "common/sqlite.h"
@@ -72,7 +76,7 @@ TEST_F(SqliteStore, AnotherSchemaVersionIsLeftAlone) {
 
 TEST_F(SqliteStore, AFolderInItsPlaceIsAFailure) {
   std::filesystem::create_directory(path());
-  EXPECT_THAT(failure(), HasSubstr("no regular file"));
+  EXPECT_THAT(failure(), HasSubstr("not a regular file"));
 }
 
 TEST_F(SqliteStore, APathThroughAFileIsAFailure) {
@@ -94,6 +98,28 @@ TEST_F(SqliteStore, MakingItLeavesNothingBeside) {
     const std::string name = entry.path().filename().string();
     EXPECT_TRUE(name == "kestrel.conf" || name.find("store.db") == 0) << name;
     EXPECT_EQ(name.find(".new-"), std::string::npos) << name;
+  }
+}
+
+// A limit of the file size fails the writes as a full disk does, at each size in turn.
+TEST_F(SqliteStore, AFirstUseThatFailsLeavesNothingBehind) {
+  for (rlim_t limit = 0; limit <= 65536; limit += 1024) {
+    const pid_t child = fork();
+    if (child == 0) {
+      const rlimit size{limit, limit};
+      signal(SIGXFSZ, SIG_IGN);
+      if (setrlimit(RLIMIT_FSIZE, &size) != 0) _exit(2);
+      _exit(failureOf([] { openBackend(Access::kCreate); }).empty() ? 0 : 1);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(status == 0 || WEXITSTATUS(status) == 1) << status;
+    for (const auto &entry : std::filesystem::directory_iterator(folder_.path())) {
+      ASSERT_EQ(entry.path().string().find(".new-"), std::string::npos) << entry.path();
+    }
+    put("x", int64_t{1});
+    ASSERT_EQ(openBackend(Access::kRead)->read(id("backup")), (Fields{{"x", int64_t{1}}})) << limit;
+    for (const char *ending : {"", "-wal", "-shm"}) std::filesystem::remove(path() + ending);
   }
 }
 
