@@ -8,9 +8,11 @@
 #include <thread>
 #include <vector>
 
-#include "unique_fd.h"
+#include "common/unique_fd.h"
 
 namespace Test {
+
+using Platform::UniqueFd;
 
 class CuttingProxy {
  public:
