@@ -129,9 +129,6 @@ bool Members::race(const Request &request, const Deadline &deadline, const Take 
         return true;
       case Outcome::End::kNone:
         return false;
-      case Outcome::End::kMoment:
-        std::this_thread::sleep_for(std::min(kPause, deadline.left()));
-        break;
       case Outcome::End::kRefused:
         if (meaningOf(outcome.refusal, false) != Meaning::kToken) {
           refuse(request, outcome.refusal, outcome.url);
@@ -161,11 +158,19 @@ class Members::Round {
     HttpResponse response;
   };
 
+  // The member is asked again, after the others and after a pause.
+  void askAgain(Member *member) {
+    waiting_.push_back(member);
+    pause_ = true;
+  }
+
   // The next response of any member; empty: there will be none before the deadline.
   std::optional<Reply> next() {
     Deadline step(hedge_);
-    for (;;) {
+    while (!deadline_.passed()) {
       if (sent_.empty() && !waiting_.empty()) {
+        if (pause_) std::this_thread::sleep_for(std::min(kPause, deadline_.left()));
+        pause_ = false;
         send();
         step = Deadline(hedge_);
       }
@@ -173,10 +178,10 @@ class Members::Round {
       if (auto finished = members_.http_.wait(waiting_.empty() ? deadline_ : step)) {
         return reply(std::move(*finished));
       }
-      if (deadline_.passed()) return std::nullopt;
-      if (!waiting_.empty()) send();
+      if (!waiting_.empty() && !deadline_.passed()) send();
       step = Deadline(hedge_);
     }
+    return std::nullopt;
   }
 
  private:
@@ -206,6 +211,7 @@ class Members::Round {
   const Request &request_;
   const Deadline &deadline_;
   Milliseconds hedge_;
+  bool pause_ = false;  // before the next member is asked
   std::vector<Member *> waiting_;
   std::vector<std::pair<HttpClient::Id, Member *>> sent_;
 };
@@ -228,7 +234,7 @@ Members::Outcome Members::round(const Request &request, const Deadline &deadline
       const Meaning meaning = meaningOf(refusal, false);
       if (meaning == Meaning::kMember) throw MemberFailure(refusal.message, true);
       if (meaning != Meaning::kMoment) return {Outcome::End::kRefused, refusal, member.url};
-      outcome.end = Outcome::End::kMoment;
+      round.askAgain(&member);
     } catch (const MemberFailure &failure) {
       // libcurl's own time limit is the round's; such a member was only not asked long enough.
       if (deadline.passed()) continue;

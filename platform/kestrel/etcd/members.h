@@ -102,7 +102,6 @@ class Members {
     enum class End {
       kTaken,    // a response was taken
       kRefused,  // a member refused; the refusal is below
-      kMoment,   // the members that responded need a moment
       kNone,     // every member failed, or the deadline passed
     };
     End end = End::kNone;
