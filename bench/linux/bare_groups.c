@@ -1,8 +1,9 @@
 /* SPDX-License-Identifier: Apache-2.0 */
 /* What making pools costs at the least: for each a mkdir and a write to each of its four control
-   files, and nothing else. The values are those of groups_on_linux.cpp's definitions.
+   files, and nothing else. The values are those of the definitions of pools.cpp. And what removing
+   them costs at the least: an rmdir each.
 
-   usage: bare_groups FOLDER COUNT */
+   usage: bare_groups make|remove FOLDER COUNT */
 #include <errno.h>
 #include <fcntl.h>
 #include <stdio.h>
@@ -25,20 +26,28 @@ static void put(const char *group, const char *file, const char *text) {
   close(descriptor);
 }
 
+static void make(const char *group, int number) {
+  if (mkdir(group, 0755) != 0) fail(group);
+  put(group, "memory.min", number % 8 == 0 ? "1048576" : "0");
+  put(group, "memory.max", "67108864");
+  put(group, "cpu.max", "50000 100000");
+  put(group, "cpu.weight", "200");
+}
+
 int main(int argc, char **argv) {
-  if (argc != 3) {
-    fprintf(stderr, "usage: bare_groups FOLDER COUNT\n");
+  const int makes = argc == 4 && strcmp(argv[1], "make") == 0;
+  if (!makes && !(argc == 4 && strcmp(argv[1], "remove") == 0)) {
+    fprintf(stderr, "usage: bare_groups make|remove FOLDER COUNT\n");
     return 2;
   }
-  const int count = atoi(argv[2]);
+  const int count = atoi(argv[3]);
   for (int i = 0; i < count; ++i) {
     char group[256];
-    snprintf(group, sizeof group, "%s/p%05d", argv[1], i);
-    if (mkdir(group, 0755) != 0) fail(group);
-    put(group, "memory.min", i % 8 == 0 ? "1048576" : "0");
-    put(group, "memory.max", "67108864");
-    put(group, "cpu.max", "50000 100000");
-    put(group, "cpu.weight", "200");
+    snprintf(group, sizeof group, "%s/p%05d", argv[2], i);
+    if (makes)
+      make(group, i);
+    else if (rmdir(group) != 0)
+      fail(group);
   }
   return 0;
 }

@@ -6,9 +6,6 @@
 // is shown beside them: it is a part of load's time that no kernel call can make up for.
 //
 // usage: bench_linux BIN_FOLDER BENCH_FOLDER, in a machine of its own
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -18,6 +15,7 @@
 #include <string>
 
 #include "child_process.h"
+#include "pools.h"
 #include "sample.h"
 
 namespace {
@@ -35,65 +33,15 @@ constexpr Size kSizes[] = {{100, 15, 3}, {1000, 9, 1}, {5000, 5, 1}};
 constexpr double kBareGoal = 1.5;
 constexpr double kParserGoal = 10;
 constexpr double kGrowthGoal = 1.2;
-constexpr const char *kMount = "/sys/fs/cgroup";
-
-std::string nameOf(int pool) {
-  char name[16];
-  std::snprintf(name, sizeof name, "p%05d", pool);
-  return name;
-}
-
-// A reservation for every eighth: of more, the machine would not have enough for the largest size.
-int minimumMB(int pool) {
-  return pool % 8 == 0 ? 1 : 0;
-}
-
-// As people write them: what is the default anyway is left out.
-void writeDefinitions(const fs::path &path, int pools) {
-  std::ofstream file(path);
-  for (int i = 0; i < pools; ++i) {
-    file << "- name: " << nameOf(i) << '\n';
-    if (minimumMB(i) != 0) file << "  memMin: " << minimumMB(i) << '\n';
-    file << "  memMax: 64\n  cpuMax: 50\n  cpuShares: 2000\n";
-  }
-}
 
 void writeParserConfiguration(const fs::path &path, int pools) {
   std::ofstream file(path);
-  for (int i = 0; i < pools; ++i)
-    file << "group parser/opt/" << nameOf(i) << " {\n  memory {\n    memory.min = \""
-         << minimumMB(i) * 1048576 << "\";\n    memory.max = \"67108864\";\n  }\n  cpu {\n"
+  for (int i = 0; i < pools; ++i) {
+    file << "group parser/opt/" << Bench::poolName(i) << " {\n  memory {\n    memory.min = \""
+         << Bench::poolMinimumMB(i) * 1048576
+         << "\";\n    memory.max = \"67108864\";\n  }\n  cpu {\n"
          << "    cpu.max = \"50000 100000\";\n    cpu.weight = \"200\";\n  }\n}\n";
-}
-
-void passOnControllers(const fs::path &group) {
-  std::ofstream file(group / "cgroup.subtree_control");
-  file << "+memory +cpu" << std::flush;
-  if (!file) throw std::runtime_error(group.string() + ": no controllers");
-}
-
-// As deep as the pools stand: host/opt.
-fs::path makeParent(const char *name) {
-  fs::path group = kMount;
-  passOnControllers(group);
-  for (const char *part : {name, "opt"}) {
-    group /= part;
-    fs::create_directory(group);
-    passOnControllers(group);
   }
-  return group;
-}
-
-void removeGroups(const fs::path &parent, int pools) {
-  for (int i = 0; i < pools; ++i)
-    if (rmdir((parent / nameOf(i)).c_str()) != 0) throw std::runtime_error("rmdir of a group");
-}
-
-void requireGroups(const fs::path &parent, int pools) {
-  std::ifstream file(parent / nameOf(pools - 1) / "memory.max");
-  std::string text;
-  if (!(file >> text) || text != "67108864")
-    throw std::runtime_error(parent.string() + ": no load");
 }
 
 struct Result {
@@ -103,20 +51,21 @@ struct Result {
 Result measure(const std::string &bin, const std::string &bench, const Size &size) {
   const fs::path work = getenv("TMPDIR");
   const fs::path definitions = work / "pools.yaml", configuration = work / "parser.conf";
-  writeDefinitions(definitions, size.pools);
+  Bench::writePoolDefinitions(definitions, size.pools);
   writeParserConfiguration(configuration, size.pools);
   Bench::runProgram({bin + "/poolctl-install", "--mark", definitions});
-  const fs::path bareParent = makeParent("bare"), parserParent = makeParent("parser");
+  const fs::path bareParent = Bench::makePoolParent("bare"),
+                 parserParent = Bench::makePoolParent("parser");
   const double pools = size.pools;
   Result result;
   for (int i = 0; i < size.repetitions; ++i) {
     const double bare =
-        Bench::runProgram({bench + "/bare_groups", bareParent, std::to_string(size.pools)})
+        Bench::runProgram({bench + "/bare_groups", "make", bareParent, std::to_string(size.pools)})
             .wallMicroseconds;
-    requireGroups(bareParent, size.pools);
-    removeGroups(bareParent, size.pools);
+    Bench::requirePoolGroups(bareParent, size.pools);
+    Bench::removePoolGroups(bareParent, size.pools);
     const double load = Bench::runProgram({bin + "/poolctl", "load", definitions}).wallMicroseconds;
-    requireGroups(fs::path(kMount) / "host/opt", size.pools);
+    Bench::requirePoolGroups(fs::path(Bench::kCgroupMount) / "host/opt", size.pools);
     result.unload.add(
         Bench::runProgram({bin + "/poolctl", "unload", definitions}).wallMicroseconds / pools);
     result.reading.add(Bench::runProgram({bench + "/bare_walk", definitions}).wallMicroseconds /
@@ -129,8 +78,8 @@ Result measure(const std::string &bin, const std::string &bench, const Size &siz
     result.parser.add(
         Bench::runProgram({"/usr/sbin/cgconfigparser", "-l", configuration}).wallMicroseconds /
         pools);
-    requireGroups(parserParent, size.pools);
-    removeGroups(parserParent, size.pools);
+    Bench::requirePoolGroups(parserParent, size.pools);
+    Bench::removePoolGroups(parserParent, size.pools);
   }
   return result;
 }

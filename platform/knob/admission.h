@@ -23,9 +23,9 @@ int64_t reservationOf(const ResourceState &state);
 // How much can be reserved in all: MB of physical memory, or 100 percent for each CPU.
 int64_t machineCapacity(const HostFacts &facts, Resource resource);
 
-// states: the group first, then every group above it, up to the root. Gives the states as they are
-// once the group has the wanted allocation, or nothing when that does not fit. The states beyond
-// the last one that changes are left out.
+// states: of the group first, then of every group above it, up to the root. Returns the states
+// after the group has the wanted allocation, up to the last one that changes; nothing when the
+// allocation does not fit.
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
                                                 const Allocation &wanted, int64_t capacity);
 

@@ -75,7 +75,7 @@ struct GroupView {
 struct Finding {
   std::string path;
   std::string text;
-  bool mended = false;
+  bool repaired = false;
 };
 
 class KernelError : public std::runtime_error {

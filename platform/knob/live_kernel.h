@@ -23,7 +23,7 @@ class LiveKernel {
     try {
       return f(*kernel_);
     } catch (const KernelError &error) {
-      // The next call looks afresh: the state may have been mended meanwhile.
+      // The next call opens it again: the state may have been repaired by then.
       if (error.status == Status::kKernelNotUsable) kernel_.reset();
       throw;
     }

@@ -8,7 +8,7 @@
 #include "knob/allocation.h"
 #include "knob/node_ids.h"
 #include "knob/param_list.h"
-#include "knob/records.h"
+#include "platform/knob_records.h"
 
 namespace Knob {
 namespace {
@@ -21,27 +21,27 @@ void write(const NodeCall &call, const Record &record) {
 
 void getCpuInfo(const NodeCall &call) {
   const HostFacts facts = call.kernel.facts();
-  CpuInfoRecord record;
+  KNOB_CpuInfo record{};
   record.cpus = facts.cpus;
   record.isVm = facts.isVm ? 1 : 0;
   write(call, record);
 }
 
 void getVmLimits(const NodeCall &call) {
-  VmLimitsRecord record;
+  KNOB_VmLimits record{};
   record.maxVms = call.kernel.facts().maxVms;
   write(call, record);
 }
 
 void getBootCommandLine(const NodeCall &call) {
   const std::string line = call.kernel.facts().bootCommandLine;
-  BootCommandLineRecord record;
-  std::copy_n(line.begin(), std::min(line.size(), record.text.size() - 1), record.text.begin());
+  KNOB_BootCommandLine record{};
+  std::copy_n(line.begin(), std::min(line.size(), sizeof record.text - 1), record.text);
   write(call, record);
 }
 
 void getMemory(const NodeCall &call) {
-  MemoryRecord record;
+  KNOB_MemoryInfo record{};
   record.physicalKB = call.kernel.facts().memoryKB;
   write(call, record);
 }
@@ -60,7 +60,7 @@ void remove(const NodeCall &call) {
 
 void getMemoryAllocation(const NodeCall &call) {
   const Allocation allocation = call.kernel.readAllocation(call.group, Resource::kMemory);
-  MemoryAllocationRecord record;
+  KNOB_MemAllocation record{};
   record.min = allocation.min;
   record.max = allocation.max;
   record.shares = allocation.shares;
@@ -70,7 +70,7 @@ void getMemoryAllocation(const NodeCall &call) {
 
 void getCpuAllocation(const NodeCall &call) {
   const Allocation allocation = call.kernel.readAllocation(call.group, Resource::kCpu);
-  CpuAllocationRecord record;
+  KNOB_CpuAllocation record{};
   record.min = static_cast<int32_t>(allocation.min);
   record.max = static_cast<int32_t>(allocation.max);
   record.shares = static_cast<int32_t>(allocation.shares);
@@ -89,7 +89,7 @@ void join(const NodeCall &call) {
 
 void getMemoryStatistics(const NodeCall &call) {
   const MemoryStatistics statistics = call.kernel.memoryStatistics(call.group);
-  MemoryStatisticsRecord record;
+  KNOB_MemoryStats record{};
   record.ownReservedPeakKB = statistics.ownReservedPeakKB;
   record.childrenReservedPeakKB = statistics.childrenReservedPeakKB;
   write(call, record);
@@ -107,23 +107,23 @@ constexpr InputShape kNoInput = InputShape::kNothing;
 
 // id, of a group, get and its size, set with its input and the size of its answer, list
 constexpr std::array<Node, kNodeCount> kNodes = {
-    Node{kCpuInfoNode, false, getCpuInfo, sizeof(CpuInfoRecord), nullptr, kNoInput, 0, nullptr},
-    Node{kVmLimitsNode, false, getVmLimits, sizeof(VmLimitsRecord), nullptr, kNoInput, 0, nullptr},
-    Node{kBootCmdLineNode, false, getBootCommandLine, sizeof(BootCommandLineRecord), nullptr,
+    Node{kCpuInfoNode, false, getCpuInfo, sizeof(KNOB_CpuInfo), nullptr, kNoInput, 0, nullptr},
+    Node{kVmLimitsNode, false, getVmLimits, sizeof(KNOB_VmLimits), nullptr, kNoInput, 0, nullptr},
+    Node{kBootCmdLineNode, false, getBootCommandLine, sizeof(KNOB_BootCommandLine), nullptr,
          kNoInput, 0, nullptr},
-    Node{kMemoryNode, false, getMemory, sizeof(MemoryRecord), nullptr, kNoInput, 0, nullptr},
+    Node{kMemoryNode, false, getMemory, sizeof(KNOB_MemoryInfo), nullptr, kNoInput, 0, nullptr},
     Node{kPathToIdNode, false, nullptr, 0, lookUp, InputShape::kOneText, sizeof(GroupId), nullptr},
     Node{kGroupCreateNode, true, nullptr, 0, create, InputShape::kOneText, sizeof(GroupId),
          nullptr},
     Node{kGroupDeleteNode, true, nullptr, 0, remove, kNoInput, 0, nullptr},
-    Node{kMemAllocationNode, true, getMemoryAllocation, sizeof(MemoryAllocationRecord),
+    Node{kMemAllocationNode, true, getMemoryAllocation, sizeof(KNOB_MemAllocation),
          setAllocation<Resource::kMemory>, InputShape::kSettings, 0, nullptr},
-    Node{kCpuAllocationNode, true, getCpuAllocation, sizeof(CpuAllocationRecord),
+    Node{kCpuAllocationNode, true, getCpuAllocation, sizeof(KNOB_CpuAllocation),
          setAllocation<Resource::kCpu>, InputShape::kSettings, 0, nullptr},
     Node{kMemberGroupsNode, true, nullptr, 0, nullptr, kNoInput, 0, listGroups},
     Node{kMemberWorldsNode, true, nullptr, 0, join, InputShape::kOneInt, 0, listMembers},
-    Node{kMemoryStatsNode, true, getMemoryStatistics, sizeof(MemoryStatisticsRecord), nullptr,
-         kNoInput, 0, nullptr},
+    Node{kMemoryStatsNode, true, getMemoryStatistics, sizeof(KNOB_MemoryStats), nullptr, kNoInput,
+         0, nullptr},
 };
 
 const Node &nodeOf(KNOB_NodeID id) {

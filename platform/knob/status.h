@@ -1,27 +1,29 @@
 // SPDX-License-Identifier: Apache-2.0
-// The statuses of libknob and their texts for people, in one table.
+// The public statuses as a type of libknob, and their texts for people, in one table.
 #pragma once
 
 #include <array>
 #include <cstdint>
 
+#include "platform/knob_status.h"
+
 namespace Knob {
 
 enum class Status : uint32_t {
-  kSuccess = 0,
-  kFailure = 0x0BAD0001,
-  kNotFound = 0x0BAD0003,
-  kBusy = 0x0BAD0004,
-  kExists = 0x0BAD0005,
-  kBadParameter = 0x0BAD0007,
-  kOutOfMemory = 0x0BAD0014,
-  kBadNode = 0x0BAD0040,
-  kBufferSize = 0x0BAD0041,
-  kNotSupported = 0x0BAD0042,
-  kPermissionDenied = 0x0BAD0043,
-  kMemoryBusy = 0x0BAD0080,
-  kReservationRefused = 0x0BAD0081,
-  kKernelNotUsable = 0x0BAD00C0,
+  kSuccess = KNOB_STATUS_SUCCESS,
+  kFailure = KNOB_STATUS_FAILURE,
+  kNotFound = KNOB_STATUS_NOT_FOUND,
+  kBusy = KNOB_STATUS_BUSY,
+  kExists = KNOB_STATUS_EXISTS,
+  kBadParameter = KNOB_STATUS_BAD_PARAMETER,
+  kOutOfMemory = KNOB_STATUS_OUT_OF_MEMORY,
+  kBadNode = KNOB_STATUS_BAD_NODE,
+  kBufferSize = KNOB_STATUS_BUFFER_SIZE,
+  kNotSupported = KNOB_STATUS_NOT_SUPPORTED,
+  kPermissionDenied = KNOB_STATUS_PERMISSION_DENIED,
+  kMemoryBusy = KNOB_STATUS_MEMORY_BUSY,
+  kReservationRefused = KNOB_STATUS_RESERVATION_REFUSED,
+  kKernelNotUsable = KNOB_STATUS_KERNEL_NOT_USABLE,
 };
 
 struct StatusText {

@@ -26,22 +26,28 @@ constexpr int kMaxLevels = 5000;
 constexpr float kNoAddend = -0.0F;
 
 constexpr const char *kTooDeep = "expression nested too deeply";
+constexpr const char *kNoEnd = "expression never ends: True or False after an operator";
 
 bool isSpace(char c) {
   return std::isspace(static_cast<unsigned char>(c)) != 0;
 }
+
 bool isNameStart(char c) {
   return std::isalpha(static_cast<unsigned char>(c)) != 0 || c == '_';
 }
+
 bool isNamePart(char c) {
   return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_' || c == '.';
 }
+
 bool startsWith(const char *text, const char *word) {
   return std::strncmp(text, word, std::strlen(word)) == 0;
 }
+
 bool isTrue(float value) {
   return value != 0.0F;
 }
+
 float truth(bool value) {
   return value ? 1.0F : 0.0F;
 }
@@ -56,10 +62,12 @@ const char *skipSpace(const char *at) {
 [[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
+
 [[noreturn, gnu::noinline]] void failExpected(const char *name, const char *what,
                                               const char *position) {
   throw Exception(std::string(name) + " expected " + what, position);
 }
+
 [[noreturn, gnu::noinline]] void failUnknown(const char *name, const char *after) {
   throw Exception("unexpected symbol: " + std::string(name, after), name);
 }
@@ -123,10 +131,10 @@ void Reader::enterLevel(const char *place) {
   if (++level_ > kMaxLevels) fail(kTooDeep, place);
 }
 
-// Behind an operator, "True" and "False" leave the cursor at that operator, which would be read
+// After an operator, "True" and "False" leave the cursor at that operator, which would be read
 // again without end.
 void Reader::takeOperator(const char *place) {
-  if (place < nextOperator_) fail(kTooDeep, place);
+  if (place < nextOperator_) fail(kNoEnd, place);
   nextOperator_ = place + 1;
 }
 

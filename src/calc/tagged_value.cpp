@@ -11,14 +11,17 @@
 
 namespace {
 
-// Through an alias a value can hold itself, or hold twice a value that holds twice a value; both
-// would keep the tool busy for ever. Values that somebody wrote stay far below both bounds.
+// Through an alias a value can contain itself, or contain twice a value that contains twice
+// another one. Without a bound the first would never end and the second take hours. Values that
+// people write stay far below both bounds.
 class Nesting {
  public:
   explicit Nesting(const YAML::Node &node) {
     if (depth_ == 0) conversions_ = 0;
-    if (depth_ >= kMaxDepth || conversions_ >= kMaxConversions) {
-      throw Loader::Exception(node.Mark(), "value nested too deeply");
+    if (depth_ >= kMaxDepth) throw Loader::Exception(node.Mark(), "value nested too deeply");
+    if (conversions_ >= kMaxConversions) {
+      throw Loader::Exception(node.Mark(),
+                              "more than " + std::to_string(kMaxConversions) + " values in one");
     }
     ++depth_;
     ++conversions_;
@@ -31,7 +34,8 @@ class Nesting {
   static constexpr int kMaxDepth = 500;
   static constexpr int kMaxConversions = 100000;
 
-  // The conversions call one another through functions that carry a node and the variables alone.
+  // Counted per thread and not passed on: the functions between two conversions take a node and the
+  // variables alone.
   static thread_local int depth_;
   static thread_local int conversions_;
 };

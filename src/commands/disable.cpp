@@ -10,6 +10,7 @@
 
 #include "commands/commands.h"
 #include "commands/operands.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -38,7 +39,7 @@ void disableOnce(const std::string &name, const Options &options) {
 }
 
 bool isBusy(const Sched::Exception &failure) {
-  return failure.status == Sched::kStatusMemoryBusy || failure.status == Sched::kStatusBusy;
+  return failure.status == KNOB_STATUS_MEMORY_BUSY || failure.status == KNOB_STATUS_BUSY;
 }
 
 // Whether the pool is done with; false asks for another attempt.
@@ -46,12 +47,12 @@ bool tryDisable(const std::string &name, const Options &options) {
   try {
     disableOnce(name, options);
   } catch (const Sched::Exception &failure) {
-    if (failure.status == Sched::kStatusNotFound) {
+    if (failure.status == KNOB_STATUS_NOT_FOUND) {
       std::cout << name << ": " << failure.what() << std::endl;
       return true;
     }
     if (isBusy(failure)) {
-      if (options.deadlineSeconds < time(nullptr)) throw Sched::Exception(name, Sched::kStatusBusy);
+      if (options.deadlineSeconds < time(nullptr)) throw Sched::Exception(name, KNOB_STATUS_BUSY);
       return false;
     }
     // The entry point reports it once more, without the name.

@@ -9,6 +9,7 @@
 #include "commands/commands.h"
 #include "commands/operands.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -35,7 +36,7 @@ void enable(const Loader::ResourcePoolImpl &pool) {
   try {
     restoreMemory(pool);
   } catch (const Sched::Exception &failure) {
-    if (failure.status == Sched::kStatusNotFound) {
+    if (failure.status == KNOB_STATUS_NOT_FOUND) {
       Sched::createGroup(pool.name, pool.mem, pool.cpu);
     } else {
       std::cerr << pool.name << ": " << failure.what() << std::endl;

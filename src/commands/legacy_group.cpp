@@ -4,27 +4,17 @@
 
 #include <array>
 #include <cstdio>
-#include <cstring>
 
+#include "platform/knob_records.h"
+#include "platform/knob_status.h"
 #include "platform/param_list.h"
 
 namespace Legacy {
 namespace {
 
-constexpr KNOB_ReturnStatus kNoMemory = 0x0BAD0014;
-
-using MemoryAllocationRecord = std::array<char, 36>;
-using MemoryStatisticsRecord = std::array<char, 382>;
-
-template <typename Field, typename Record>
-Field fieldAt(const Record &record, size_t offset) {
-  Field field;
-  std::memcpy(&field, record.data() + offset, sizeof field);
-  return field;
-}
-
 KNOB_ReturnStatus addId(const ParamList &list, int64_t id) {
-  return list ? KNOB_ParamListAddInt(list.get(), id) : kNoMemory;
+  if (!list) return KNOB_STATUS_OUT_OF_MEMORY;
+  return KNOB_ParamListAddInt(list.get(), id);
 }
 
 KNOB_ReturnStatus addSetting(const ParamList &list, const char *format, int value) {
@@ -37,7 +27,7 @@ KNOB_ReturnStatus addSetting(const ParamList &list, const char *format, int valu
 
 KNOB_ReturnStatus lookUpGroup(const char *path, int64_t *id) {
   const ParamList input(ParamList::Kind::kInput, 1);
-  if (!input) return kNoMemory;
+  if (!input) return KNOB_STATUS_OUT_OF_MEMORY;
   if (const auto status = KNOB_ParamListAddString(input.get(), path)) return status;
   return KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, input.get(), id, sizeof *id);
 }
@@ -58,20 +48,20 @@ KNOB_ReturnStatus countMemberGroups(int64_t id, int *count) {
 KNOB_ReturnStatus readMemoryReport(int64_t id, MemoryReport *report) {
   const ParamList instance(ParamList::Kind::kInstance, 1);
   if (const auto status = addId(instance, id)) return status;
-  MemoryAllocationRecord allocation;
+  KNOB_MemAllocation allocation;
   if (const auto status = KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance.get(),
-                                   allocation.data(), allocation.size())) {
+                                   &allocation, sizeof allocation)) {
     return status;
   }
-  MemoryStatisticsRecord statistics;
+  KNOB_MemoryStats statistics;
   if (const auto status = KNOB_Get(KNOB_NODE_sched_groups_stats_memoryStats, instance.get(),
-                                   statistics.data(), statistics.size())) {
+                                   &statistics, sizeof statistics)) {
     return status;
   }
-  report->minMB = fieldAt<int64_t>(allocation, 0);
-  report->maxMB = fieldAt<int64_t>(allocation, 8);
-  report->ownPeakKB = fieldAt<uint64_t>(statistics, 309);
-  report->childrenPeakKB = fieldAt<uint64_t>(statistics, 374);
+  report->minMB = allocation.min;
+  report->maxMB = allocation.max;
+  report->ownPeakKB = statistics.ownReservedPeakKB;
+  report->childrenPeakKB = statistics.childrenReservedPeakKB;
   return 0;
 }
 
@@ -79,7 +69,7 @@ KNOB_ReturnStatus setGroupMemSize(int64_t id, int sizeMB) {
   const ParamList instance(ParamList::Kind::kInstance, 1);
   if (const auto status = addId(instance, id)) return status;
   const ParamList input(ParamList::Kind::kInput, 2);
-  if (!input) return kNoMemory;
+  if (!input) return KNOB_STATUS_OUT_OF_MEMORY;
   if (const auto status = addSetting(input, "min=%d", sizeMB)) return status;
   if (const auto status = addSetting(input, "max=%d", sizeMB)) return status;
   return KNOB_Set(KNOB_NODE_sched_groups_memAllocationInMB, instance.get(), input.get(), nullptr,

@@ -36,6 +36,7 @@ constexpr Form kCsv = {0, 0, ','};
 std::string int64ToString(int64_t value) {
   return value == -1 ? "-" : std::to_string(value);
 }
+
 std::string int32ToString(int32_t value) {
   return value == -1 ? "-" : std::to_string(value);
 }

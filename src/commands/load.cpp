@@ -7,6 +7,7 @@
 #include "commands/commands.h"
 #include "commands/operands.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -37,7 +38,7 @@ void load(const Loader::PoolList &pools, bool quiet) {
     try {
       Sched::createGroup(pool->name, pool->mem, pool->cpu);
     } catch (const Sched::Exception &failure) {
-      if (failure.status != Sched::kStatusExists) {
+      if (failure.status != KNOB_STATUS_EXISTS) {
         undo(created);
         throw;
       }

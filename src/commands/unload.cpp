@@ -7,6 +7,7 @@
 #include "commands/commands.h"
 #include "commands/operands.h"
 #include "loader/definition_files.h"
+#include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
 
@@ -44,7 +45,7 @@ void unload(const Loader::PoolList &pools) {
     try {
       deletePool(*pool);
     } catch (const Sched::Exception &failure) {
-      if (failure.status == Sched::kStatusNotFound) continue;
+      if (failure.status == KNOB_STATUS_NOT_FOUND) continue;
       undo(deleted);
       throw;
     }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The failure of one scheduler-group operation, and the kernel statuses that callers tell apart.
+// The failure of one scheduler-group operation.
 #pragma once
 
 #include <cstdint>
@@ -7,12 +7,6 @@
 #include <string>
 
 namespace Sched {
-
-constexpr uint32_t kStatusNotFound = 0x0BAD0003;
-constexpr uint32_t kStatusBusy = 0x0BAD0004;
-constexpr uint32_t kStatusMemoryBusy = 0x0BAD0080;
-constexpr uint32_t kStatusExists = 0x0BAD0005;
-constexpr uint32_t kStatusNoMemory = 0x0BAD0014;
 
 // what(): the leading text, ": ", and the kernel's text for the status.
 class Exception : public std::runtime_error {

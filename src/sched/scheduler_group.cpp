@@ -5,6 +5,7 @@
 #include <exception>
 
 #include "platform/knob.h"
+#include "platform/knob_status.h"
 #include "platform/param_list.h"
 #include "sched/exception.h"
 
@@ -19,7 +20,7 @@ void check(KNOB_ReturnStatus status, const char *call) {
 }
 
 void requireList(const ParamList &list) {
-  if (!list) throw Exception("KNOB_ParamListCreate", kStatusNoMemory);
+  if (!list) throw Exception("KNOB_ParamListCreate", KNOB_STATUS_OUT_OF_MEMORY);
 }
 
 void addInt(const ParamList &list, int64_t value) {

@@ -46,9 +46,10 @@ class Binaries : public testing::Test {
         world.run(CMAKE_PROGRAM, {"--install", BUILD_FOLDER, "--prefix", prefix.string()});
     EXPECT_EQ(result.status, 0) << result.out << result.err;
     std::vector<fs::path> files;
-    for (const char *part : {"bin", "sbin", "lib"})
+    for (const char *part : {"bin", "sbin", "lib"}) {
       for (const fs::directory_entry &entry : fs::directory_iterator(prefix / part))
         if (entry.is_regular_file() && !entry.is_symlink()) files.push_back(entry.path());
+    }
     EXPECT_EQ(files.size(), built().size());
     return files;
   }
@@ -73,15 +74,17 @@ class Binaries : public testing::Test {
 };
 
 TEST_F(Binaries, BuiltOnesNeverLookInTheCurrentFolder) {
-  for (const fs::path &file : built())
+  for (const fs::path &file : built()) {
     for (const std::string &folder : searchPath(file))
       EXPECT_THAT(folder, AnyOf(StartsWith("$ORIGIN"), StartsWith("/"))) << file;
+  }
 }
 
 TEST_F(Binaries, InstalledOnesNeverLookInTheCurrentFolder) {
-  for (const fs::path &file : installed())
+  for (const fs::path &file : installed()) {
     for (const std::string &folder : searchPath(file))
       EXPECT_THAT(folder, AnyOf(StartsWith("$ORIGIN"), StartsWith("/"))) << file;
+  }
 }
 
 TEST_F(Binaries, InstalledOnesNeverLookInTheBuildFolder) {

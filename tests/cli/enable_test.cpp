@@ -53,6 +53,13 @@ TEST_F(Enable, LeavesSharesThatAreNotDefinedAsTheyAre) {
   EXPECT_EQ(world.groups(), treeWith("host/opt/b mem 5 6 -1 0 cpu 0 -1 -1 -3\n"));
 }
 
+TEST_F(Enable, RestoresAPoolThatDefinesNoMaximum) {
+  world.definition("c.yaml", "- {name: c, memMin: 1}\n");
+  world.knob("group host/opt/c min=0 max=0 minLimit=0 shares=0");
+  expectRun(world.poolctl({"enable", "host/opt/c"}), 0, "", "");
+  EXPECT_EQ(world.groups(), treeWith("host/opt/c mem 1 -1 -1 0 cpu 0 -1 -1 -3\n"));
+}
+
 TEST_F(Enable, LeavesAGroupWithAMaximumAsItIs) {
   world.knob("group host/opt/a min=8 max=9");
   expectRun(world.poolctl({"enable", "host/opt/a"}), 0, "", "");

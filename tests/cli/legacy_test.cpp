@@ -86,10 +86,11 @@ TEST_F(Legacy, AnUnknownOptionPrintsTheUsage) {
 }
 
 TEST_F(Legacy, AnOptionWithoutItsValuePrintsTheUsage) {
-  for (const std::string option : {"g", "m", "w"})
+  for (const std::string option : {"g", "m", "w"}) {
     expectRun(world.poolctl({"-" + option}), 1, "",
               (binFolder() / "poolctl").string() + ": option requires an argument -- '" + option +
                   "'\n" + kLegacyUsage);
+  }
 }
 
 TEST_F(Legacy, OperandsMeanNothing) {

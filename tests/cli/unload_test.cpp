@@ -15,9 +15,10 @@ class Unload : public Cli {
   Calls lookedUp() {
     Calls result;
     const std::string begin = "KNOB_Set sched_groupPathNameToID instance=null input=[\"";
-    for (const std::string &call : world.groupCalls())
+    for (const std::string &call : world.groupCalls()) {
       if (call.compare(0, begin.size(), begin) == 0)
         result.push_back(call.substr(begin.size(), call.find("\"]") - begin.size()));
+    }
     return result;
   }
 

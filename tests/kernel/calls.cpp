@@ -4,11 +4,11 @@
 
 #include <gtest/gtest.h>
 
-#include <array>
-#include <cstring>
 #include <memory>
 #include <ostream>
 #include <tuple>
+
+#include "platform/knob_records.h"
 
 namespace Contract {
 namespace {
@@ -32,11 +32,18 @@ List input(const Texts &texts) {
   return list;
 }
 
-template <typename T, size_t kSize>
-T at(const std::array<char, kSize> &record, size_t offset) {
-  T value;
-  std::memcpy(&value, record.data() + offset, sizeof(value));
-  return value;
+// Reads one record of a group.
+template <typename Record>
+Answer<Record> get(KNOB_NodeID node, int64_t id) {
+  Record record{};
+  const auto status = KNOB_Get(node, instance(id).get(), &record, sizeof record);
+  return {status, record};
+}
+
+template <typename Record>
+Answer<Settings> settings(const Answer<Record> &allocation) {
+  const Record &record = allocation.value;
+  return {allocation.status, {record.min, record.max, record.minLimit, record.shares}};
 }
 
 }  // namespace
@@ -80,21 +87,11 @@ KNOB_ReturnStatus setCpu(int64_t id, const Texts &settings) {
 }
 
 Answer<Settings> memory(int64_t id) {
-  std::array<char, 36> record{};
-  const auto status = KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance(id).get(),
-                               record.data(), record.size());
-  return {status,
-          {at<int64_t>(record, 0), at<int64_t>(record, 8), at<int64_t>(record, 24),
-           at<int64_t>(record, 16)}};
+  return settings(get<KNOB_MemAllocation>(KNOB_NODE_sched_groups_memAllocationInMB, id));
 }
 
 Answer<Settings> cpu(int64_t id) {
-  std::array<char, 20> record{};
-  const auto status = KNOB_Get(KNOB_NODE_sched_groups_cpuAllocationInPct, instance(id).get(),
-                               record.data(), record.size());
-  return {status,
-          {at<int32_t>(record, 0), at<int32_t>(record, 4), at<int32_t>(record, 12),
-           at<int32_t>(record, 8)}};
+  return settings(get<KNOB_CpuAllocation>(KNOB_NODE_sched_groups_cpuAllocationInPct, id));
 }
 
 namespace {
@@ -125,10 +122,8 @@ KNOB_ReturnStatus join(int64_t id, int64_t pid) {
 }
 
 Answer<Peaks> peaks(int64_t id) {
-  std::array<char, 382> record{};
-  const auto status = KNOB_Get(KNOB_NODE_sched_groups_stats_memoryStats, instance(id).get(),
-                               record.data(), record.size());
-  return {status, {at<uint64_t>(record, 309), at<uint64_t>(record, 374)}};
+  const auto stats = get<KNOB_MemoryStats>(KNOB_NODE_sched_groups_stats_memoryStats, id);
+  return {stats.status, {stats.value.ownReservedPeakKB, stats.value.childrenReservedPeakKB}};
 }
 
 int64_t idOf(const std::string &path) {

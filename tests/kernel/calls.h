@@ -8,19 +8,20 @@
 #include <vector>
 
 #include "platform/knob.h"
+#include "platform/knob_status.h"
 
 namespace Contract {
 
-// The statuses that the contract fixes, and those of this library.
-inline constexpr KNOB_ReturnStatus kSuccess = 0;
-inline constexpr KNOB_ReturnStatus kNotFound = 0x0BAD0003;
-inline constexpr KNOB_ReturnStatus kBusy = 0x0BAD0004;
-inline constexpr KNOB_ReturnStatus kExists = 0x0BAD0005;
-inline constexpr KNOB_ReturnStatus kBadParameter = 0x0BAD0007;
-inline constexpr KNOB_ReturnStatus kOutOfMemory = 0x0BAD0014;
-inline constexpr KNOB_ReturnStatus kPermissionDenied = 0x0BAD0043;
-inline constexpr KNOB_ReturnStatus kMemoryBusy = 0x0BAD0080;
-inline constexpr KNOB_ReturnStatus kReservationRefused = 0x0BAD0081;
+// Short names for the cases.
+inline constexpr KNOB_ReturnStatus kSuccess = KNOB_STATUS_SUCCESS;
+inline constexpr KNOB_ReturnStatus kNotFound = KNOB_STATUS_NOT_FOUND;
+inline constexpr KNOB_ReturnStatus kBusy = KNOB_STATUS_BUSY;
+inline constexpr KNOB_ReturnStatus kExists = KNOB_STATUS_EXISTS;
+inline constexpr KNOB_ReturnStatus kBadParameter = KNOB_STATUS_BAD_PARAMETER;
+inline constexpr KNOB_ReturnStatus kOutOfMemory = KNOB_STATUS_OUT_OF_MEMORY;
+inline constexpr KNOB_ReturnStatus kPermissionDenied = KNOB_STATUS_PERMISSION_DENIED;
+inline constexpr KNOB_ReturnStatus kMemoryBusy = KNOB_STATUS_MEMORY_BUSY;
+inline constexpr KNOB_ReturnStatus kReservationRefused = KNOB_STATUS_RESERVATION_REFUSED;
 
 template <typename T>
 struct Answer {

@@ -96,9 +96,10 @@ class Crash : public LinuxTest {
   static void expectEveryPromiseCovered() {
     for (const std::string &group : allGroups()) {
       int64_t below = 0;
-      for (const std::string &other : allGroups())
+      for (const std::string &other : allGroups()) {
         if (other.rfind('/') == group.size() && other.compare(0, group.size(), group) == 0)
           below += numberIn(other, "memory.min");
+      }
       EXPECT_GE(numberIn(group, "memory.min"), below) << group;
     }
   }
@@ -120,9 +121,10 @@ class Crash : public LinuxTest {
       }
       there[group] = numbers;
     }
-    for (const auto &[group, files] : expectedFiles(there, 1))
+    for (const auto &[group, files] : expectedFiles(there, 1)) {
       EXPECT_EQ(numberIn(group, "memory.min"), std::stoll(files.substr(files.find(": ") + 2)))
           << group;
+    }
   }
 
   // What people do after a crash. All pools are loaded then.
@@ -142,9 +144,10 @@ class Crash : public LinuxTest {
 
   static void expectNothingLeft() {
     EXPECT_EQ(allGroups(), kFixedGroups);
-    for (const std::string &group : kFixedGroups)
+    for (const std::string &group : kFixedGroups) {
       EXPECT_EQ(actualFiles(group),
                 "memory.min: 0\nmemory.max: max\ncpu.max: max 100000\ncpu.weight: 100\n");
+    }
   }
 
   std::string file_;
@@ -182,16 +185,18 @@ TEST_F(Crash, FourAtOnceForTwentySecondsLeaveATreeThatTheNextCanUse) {
   const auto end = Clock::now() + std::chrono::seconds(20);
   std::vector<std::thread> workers;
   std::atomic<int> runs{0}, loads{0}, crashes{0};
-  for (int i = 0; i < 4; ++i)
+  for (int i = 0; i < 4; ++i) {
     workers.emplace_back([&] {
-      while (Clock::now() < end)
+      while (Clock::now() < end) {
         for (const char *command : {"load", "unload"}) {
           const int status = waitFor(start(command));
           ++runs;
           if (!WIFEXITED(status) || WEXITSTATUS(status) > 1) ++crashes;
           if (status == 0 && command[0] == 'l') ++loads;
         }
+      }
     });
+  }
   for (std::thread &worker : workers) worker.join();
   std::cout << runs << " runs, " << loads << " complete loads\n";
   EXPECT_EQ(crashes, 0);

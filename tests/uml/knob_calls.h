@@ -8,14 +8,15 @@
 #include <vector>
 
 #include "platform/knob.h"
+#include "platform/knob_status.h"
 #include "platform/param_list.h"
 
 namespace Uml {
 
-constexpr KNOB_ReturnStatus kNotFound = 0x0BAD0003;
-constexpr KNOB_ReturnStatus kBusy = 0x0BAD0004;
-constexpr KNOB_ReturnStatus kExists = 0x0BAD0005;
-constexpr KNOB_ReturnStatus kBadParameter = 0x0BAD0007;
+constexpr KNOB_ReturnStatus kNotFound = KNOB_STATUS_NOT_FOUND;
+constexpr KNOB_ReturnStatus kBusy = KNOB_STATUS_BUSY;
+constexpr KNOB_ReturnStatus kExists = KNOB_STATUS_EXISTS;
+constexpr KNOB_ReturnStatus kBadParameter = KNOB_STATUS_BAD_PARAMETER;
 
 inline KNOB_ReturnStatus lookUp(const std::string &path, int64_t *id) {
   const ParamList input(ParamList::Kind::kInput, 1);

@@ -94,9 +94,10 @@ TEST_F(Poolctl, UnloadLeavesNothing) {
       silentlyDone(load("- name: a\n  memMin: 64\n  cpuMin: 10\n- name: a/b\n  memMin: 8\n")));
   ASSERT_TRUE(silentlyDone(world.poolctl({"unload", (world.folder() / "pools.yaml").string()})));
   EXPECT_EQ(allGroups(), kFixedGroups);
-  for (const std::string &group : kFixedGroups)
+  for (const std::string &group : kFixedGroups) {
     EXPECT_EQ(actualFiles(group),
               "memory.min: 0\nmemory.max: max\ncpu.max: max 100000\ncpu.weight: 100\n");
+  }
 }
 
 TEST_F(Poolctl, ASecondLoadLeavesTheGroupsAsTheyAre) {

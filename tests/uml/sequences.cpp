@@ -111,9 +111,10 @@ class Sequence {
   // Where processes live a maximum is nothing or much more than they use: what lies between is
   // a matter of measurement, and not the same number on both kernels.
   std::string anyEntry() {
-    if (chance(25))
+    if (chance(25)) {
       return pick({"min", "min=", "=1", "min=x", "min=1 ", "Min=1", "max=99999999999999999999",
                    "min=-2", "max=-2", "minLimit=-7", "shares=-1", "shares=-5", "min=0x1"});
+    }
     switch (below(8)) {
       case 0:
       case 1:

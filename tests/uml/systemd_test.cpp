@@ -118,10 +118,11 @@ TEST_F(Systemd, AServiceStartedThroughPoolctlExecIsInItsPoolAndInNoUnitsGroup) {
             "active\nactive\n");
   EXPECT_EQ(numberIn(kPool, "memory.min"), 48 * kMiB);
   EXPECT_EQ(numberIn("host", "memory.min"), 64 * kMiB);
-  for (const std::string &group : allGroups())
+  for (const std::string &group : allGroups()) {
     if (group.find("storaged.service") != std::string::npos) {
       EXPECT_EQ(readControl(group, "cgroup.procs"), "") << group;
     }
+  }
   EXPECT_TRUE(groupExists("system.slice"));
 }
 

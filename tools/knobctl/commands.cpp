@@ -128,15 +128,15 @@ ExitStatus facts(const Words &) {
   return Tools::kExitSuccess;
 }
 
-// What was found and mended is no failure; what is left is.
+// What was found and repaired is no failure; what is left is.
 ExitStatus check(const Words &words) {
   const auto findings =
       onKernel("check", [&](Kernel &kernel) { return kernel.check(words.repair); });
   ExitStatus result = Tools::kExitSuccess;
   for (const Knob::Finding &finding : findings) {
     std::cout << printable(finding.path) << ": " << printable(finding.text)
-              << (finding.mended ? " (mended)" : "") << '\n';
-    if (!finding.mended) result = Tools::kExitFailure;
+              << (finding.repaired ? " (repaired)" : "") << '\n';
+    if (!finding.repaired) result = Tools::kExitFailure;
   }
   if (findings.empty()) std::cout << "nothing is wrong\n";
   return result;

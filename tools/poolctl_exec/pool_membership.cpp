@@ -3,20 +3,16 @@
 
 #include <unistd.h>
 
-#include <array>
 #include <cstdint>
-#include <cstring>
 #include <stdexcept>
 
 #include "platform/knob.h"
+#include "platform/knob_records.h"
+#include "platform/knob_status.h"
 #include "platform/param_list.h"
 
 namespace Exec {
 namespace {
-
-constexpr KNOB_ReturnStatus kNotFound = 0x0BAD0003;
-constexpr KNOB_ReturnStatus kBusy = 0x0BAD0004;
-constexpr KNOB_ReturnStatus kOutOfMemory = 0x0BAD0014;
 
 [[noreturn]] void refuse(const std::string &path, const char *reason) {
   throw std::runtime_error(path + ": " + reason);
@@ -29,25 +25,22 @@ int64_t lookUp(const std::string &path) {
   if (status == 0) {
     status = KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, input.get(), &id, sizeof id);
   }
-  if (status == kNotFound) refuse(path, "no such pool is loaded");
+  if (status == KNOB_STATUS_NOT_FOUND) refuse(path, "no such pool is loaded");
   if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
   return id;
 }
 
 int64_t memoryMaxMB(const std::string &path) {
-  constexpr size_t kRecordSize = 36, kMaxOffset = 8;
   const int64_t id = lookUp(path);
   const ParamList instance(ParamList::Kind::kInstance, 1);
   KNOB_ReturnStatus status = KNOB_ParamListAddInt(instance.get(), id);
-  std::array<char, kRecordSize> record{};
+  KNOB_MemAllocation allocation{};
   if (status == 0) {
-    status = KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance.get(), record.data(),
-                      record.size());
+    status = KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance.get(), &allocation,
+                      sizeof allocation);
   }
   if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
-  int64_t max = 0;
-  std::memcpy(&max, record.data() + kMaxOffset, sizeof max);
-  return max;
+  return allocation.max;
 }
 
 // Says which group it is that may have no memory, if there is one still.
@@ -76,9 +69,10 @@ void joinGroup(const std::string &path) {
     status =
         KNOB_Set(KNOB_NODE_sched_groups_members_worlds, instance.get(), input.get(), nullptr, 0);
   }
-  if (status == kNotFound) refuse(path, "the pool was unloaded in this moment");
-  if (status == kBusy) refuse(path, "the pool has pools below it, so it takes no processes itself");
-  if (status == kOutOfMemory) refuseDisabled(path);
+  if (status == KNOB_STATUS_NOT_FOUND) refuse(path, "the pool was unloaded in this moment");
+  if (status == KNOB_STATUS_BUSY)
+    refuse(path, "the pool has pools below it, so it takes no processes itself");
+  if (status == KNOB_STATUS_OUT_OF_MEMORY) refuseDisabled(path);
   if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
 }
 

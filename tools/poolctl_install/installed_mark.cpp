@@ -27,10 +27,11 @@ std::string fileSystemOf(int file) {
 }
 
 std::runtime_error markError(int file, const std::string &path, int error) {
-  if (error == ENOTSUP)
+  if (error == ENOTSUP) {
     return std::runtime_error(path + ": the file system (" + fileSystemOf(file) +
                               ") cannot hold the installed mark: it has no extended attributes "
                               "for users");
+  }
   return std::runtime_error(
       path + ": the installed mark cannot be changed: " + std::generic_category().message(error));
 }

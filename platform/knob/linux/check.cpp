@@ -147,7 +147,7 @@ class Checker {
     }
   }
 
-  // Why it could not be mended; empty when it was.
+  // Why it could not be repaired; empty when it was.
   std::string mendFile(Group &group, const Record &record, const Deviation &deviation) {
     try {
       Writes writes(groups_);
@@ -183,8 +183,8 @@ class Checker {
     }
   }
 
-  void report(const std::string &path, const std::string &text, bool mended) {
-    findings_.push_back({path, text, mended});
+  void report(const std::string &path, const std::string &text, bool repaired) {
+    findings_.push_back({path, text, repaired});
   }
 
   Groups &groups_;

@@ -319,8 +319,8 @@ TEST_F(Knobctl, CheckMendsWhatItFinds) {
   const ProcessResult found = run({"check"});
   EXPECT_EQ(found.status, 1);
   EXPECT_THAT(found.out, HasSubstr("host/opt: "));
-  EXPECT_THAT(found.out, Not(HasSubstr("(mended)")));
-  EXPECT_THAT(out({"check", "--repair"}), HasSubstr("(mended)\n"));
+  EXPECT_THAT(found.out, Not(HasSubstr("(repaired)")));
+  EXPECT_THAT(out({"check", "--repair"}), HasSubstr("(repaired)\n"));
   EXPECT_EQ(out({"check"}), "nothing is wrong\n");
 }
 

@@ -10,12 +10,14 @@
 #include <string>
 #include <vector>
 
+#include "platform/knob_status.h"
+
 namespace Recording {
 
-inline constexpr uint32_t kNotFound = 0x0BAD0003;
-inline constexpr uint32_t kBusy = 0x0BAD0004;
-inline constexpr uint32_t kExists = 0x0BAD0005;
-inline constexpr uint32_t kBadParameter = 0x0BAD0007;
+inline constexpr uint32_t kNotFound = KNOB_STATUS_NOT_FOUND;
+inline constexpr uint32_t kBusy = KNOB_STATUS_BUSY;
+inline constexpr uint32_t kExists = KNOB_STATUS_EXISTS;
+inline constexpr uint32_t kBadParameter = KNOB_STATUS_BAD_PARAMETER;
 
 struct Allocation {
   int64_t min = 0, max = -1, minLimit = -1, shares = -3;

@@ -13,6 +13,7 @@
 
 #include "model.h"
 #include "platform/knob.h"
+#include "platform/knob_records.h"
 #include "trace.h"
 
 using Recording::formatted;
@@ -190,45 +191,51 @@ struct Call {
 };
 
 template <typename T>
-void put(const Call &call, size_t offset, T value) {
-  memcpy(static_cast<char *>(call.output) + offset, &value, sizeof value);
+void put(const Call &call, const T &value) {
+  memcpy(call.output, &value, sizeof value);
 }
 
-// The bytes that nobody may rely on hold a value that would be noticed.
-bool fill(const Call &call, size_t size) {
-  if (!call.outputIs(size)) return false;
-  memset(call.output, 0xA5, size);
-  return true;
-}
-
-template <typename T>
-uint32_t getAllocation(const Call &call, const Recording::Allocation &allocation) {
-  if (!fill(call, 4 * sizeof(T) + 4)) return Recording::kBadParameter;
-  put(call, 0, static_cast<T>(allocation.min));
-  put(call, sizeof(T), static_cast<T>(allocation.max));
-  put(call, 2 * sizeof(T), static_cast<T>(allocation.shares));
-  put(call, 3 * sizeof(T), static_cast<T>(allocation.minLimit));
+// Writes a record. The bytes that have no meaning hold a value that would be noticed.
+template <typename Record, typename SetMembers>
+uint32_t putRecord(const Call &call, const SetMembers &setMembers) {
+  if (!call.outputIs(sizeof(Record))) return Recording::kBadParameter;
+  Record record;
+  memset(&record, 0xA5, sizeof record);
+  setMembers(record);
+  put(call, record);
   return 0;
+}
+
+template <typename Record>
+uint32_t getAllocation(const Call &call, const Recording::Allocation &allocation) {
+  return putRecord<Record>(call, [&](Record &record) {
+    record.min = static_cast<decltype(record.min)>(allocation.min);
+    record.max = static_cast<decltype(record.max)>(allocation.max);
+    record.shares = static_cast<decltype(record.shares)>(allocation.shares);
+    record.minLimit = static_cast<decltype(record.minLimit)>(allocation.minLimit);
+  });
 }
 
 uint32_t getFact(const Call &call) {
   const Recording::Model &model = state().model;
-  if (call.node == KNOB_NODE_hardware_cpu_cpuInfo && fill(call, 38)) {
-    put(call, 24, model.cpus);
-    put(call, 36, static_cast<uint8_t>(model.isVm));
-    return 0;
+  if (call.node == KNOB_NODE_hardware_cpu_cpuInfo) {
+    return putRecord<KNOB_CpuInfo>(call, [&](KNOB_CpuInfo &record) {
+      record.cpus = model.cpus;
+      record.isVm = static_cast<uint8_t>(model.isVm);
+    });
   }
-  if (call.node == KNOB_NODE_system_vmLimits && fill(call, 32)) {
-    put(call, 0, model.maxVms);
-    return 0;
+  if (call.node == KNOB_NODE_system_vmLimits) {
+    return putRecord<KNOB_VmLimits>(call,
+                                    [&](KNOB_VmLimits &record) { record.maxVms = model.maxVms; });
   }
-  if (call.node == KNOB_NODE_memory_comprehensive && fill(call, 80)) {
-    put(call, 0, model.memoryKB);
-    return 0;
+  if (call.node == KNOB_NODE_memory_comprehensive) {
+    return putRecord<KNOB_MemoryInfo>(
+        call, [&](KNOB_MemoryInfo &record) { record.physicalKB = model.memoryKB; });
   }
-  if (call.node == KNOB_NODE_system_bootCmdLine && fill(call, 4096)) {
-    memcpy(call.output, model.commandLine.c_str(), model.commandLine.size() + 1);
-    return 0;
+  if (call.node == KNOB_NODE_system_bootCmdLine) {
+    return putRecord<KNOB_BootCommandLine>(call, [&](KNOB_BootCommandLine &record) {
+      memcpy(record.text, model.commandLine.c_str(), model.commandLine.size() + 1);
+    });
   }
   return kBadNode;
 }
@@ -241,13 +248,14 @@ uint32_t answerGet(const Call &call) {
   const Recording::Group *group = call.group();
   if (group == nullptr) return Recording::kNotFound;
   if (call.node == KNOB_NODE_sched_groups_memAllocationInMB)
-    return getAllocation<int64_t>(call, group->memory);
+    return getAllocation<KNOB_MemAllocation>(call, group->memory);
   if (call.node == KNOB_NODE_sched_groups_cpuAllocationInPct)
-    return getAllocation<int32_t>(call, group->cpu);
-  if (call.node == KNOB_NODE_sched_groups_stats_memoryStats && fill(call, 382)) {
-    put(call, 309, group->ownPeakKB);
-    put(call, 374, group->childrenPeakKB);
-    return 0;
+    return getAllocation<KNOB_CpuAllocation>(call, group->cpu);
+  if (call.node == KNOB_NODE_sched_groups_stats_memoryStats) {
+    return putRecord<KNOB_MemoryStats>(call, [&](KNOB_MemoryStats &record) {
+      record.ownReservedPeakKB = group->ownPeakKB;
+      record.childrenReservedPeakKB = group->childrenPeakKB;
+    });
   }
   return kBadNode;
 }
@@ -260,14 +268,14 @@ uint32_t answerSet(const Call &call) {
     const Recording::Group *found = model.find(call.inputText());
     if (found == nullptr) return Recording::kNotFound;
     if (!call.outputIs(sizeof id)) return Recording::kBadParameter;
-    put(call, 0, found->id);
+    put(call, found->id);
     return 0;
   }
   if (group == nullptr) return Recording::kNotFound;
   if (call.node == KNOB_NODE_sched_groups_groupCreate) {
     if (!call.outputIs(sizeof id)) return Recording::kBadParameter;
     const uint32_t status = model.create(call.groupPath(), &id);
-    if (status == 0) put(call, 0, id);
+    if (status == 0) put(call, id);
     return status;
   }
   if (!call.outputIs(0)) return Recording::kBadParameter;

@@ -106,6 +106,17 @@ TEST_P(NestingKind, EvaluatesBelowTheBoundOnItsShareOfTheStack) {
 INSTANTIATE_TEST_SUITE_P(Bounds, NestingKind, testing::ValuesIn(kNestings),
                          [](const auto &one) { return std::string(one.param.name); });
 
+// The outermost expression is a level too.
+TEST(Bounds, FiveThousandLevelsAreTheMost) {
+  const auto parentheses = [](std::size_t count) {
+    return std::string(count, '(') + "7" + std::string(count, ')');
+  };
+  runOnStackOf(64 * kMiB, [&] {
+    EXPECT_NO_THROW(EXPECT_EQ(7.0f, Calc::Evaluate(parentheses(4999), {})));
+    EXPECT_EQ(5000u, expectTooDeep(parentheses(5000)));
+  });
+}
+
 TEST(Bounds, ASumOfFourThousandTermsEvaluates) {
   std::string text = "1";
   for (int i = 1; i < 4000; ++i) text += " + 1";

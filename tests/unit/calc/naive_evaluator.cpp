@@ -161,7 +161,9 @@ class Rules {
   }
 
   static Cursor take(Cursor cursor, std::size_t place) {
-    if (place < cursor.taken) throw Fault{"expression nested too deeply", place};
+    if (place < cursor.taken) {
+      throw Fault{"expression never ends: True or False after an operator", place};
+    }
     return {cursor.at, place + 1};
   }
 

@@ -11,11 +11,25 @@
 
 namespace {
 
-void expectRefused(const std::string &text) {
+void expectRefused(const std::string &text, const std::string &message = kTooDeep) {
   FakeStore::instance().reset();
   const YAML::Node node = yaml(text);
-  expectNestedTooDeeply([&] { NodeToFloat(node, {}); });
-  expectNestedTooDeeply([&] { NodeToBool(node, {}); });
+  expectErrorAtSomePlace([&] { NodeToFloat(node, {}); }, message);
+  expectErrorAtSomePlace([&] { NodeToBool(node, {}); }, message);
+}
+
+// LEVELS mappings, one in the other, around a plain value.
+std::string nestedMappings(int levels) {
+  std::string text = "3";
+  for (int i = 0; i < levels; ++i) text = "!calc {x: " + text + ", =: x}";
+  return text;
+}
+
+// One mapping of COUNT plain definitions.
+std::string flatMapping(int count) {
+  std::string text = "!calc\n";
+  for (int i = 0; i < count; ++i) text += "d: 3\n";
+  return text + "=: d\n";
 }
 
 TEST(NestedValue, CalcMappingThatHoldsItselfIsRefused) {
@@ -43,7 +57,7 @@ TEST(NestedValue, DoublingThirtyTimesIsRefused) {
     const std::string name = "x" + std::to_string(i);
     text += name + ": &" + name + " !calc {v: " + before + ", w: " + before + ", =: v}\n";
   }
-  expectRefused(text + "=: 1\n");
+  expectRefused(text + "=: 1\n", kTooMany);
 }
 
 TEST(NestedValue, DoublingDefaultsThirtyTimesIsRefused) {
@@ -54,7 +68,7 @@ TEST(NestedValue, DoublingDefaultsThirtyTimesIsRefused) {
     text += name + ": &" + name + " !config {object: [a, b, c], key: k, default: " + before +
             ", default: " + before + "}\n";
   }
-  expectRefused(text + "=: 1\n");
+  expectRefused(text + "=: 1\n", kTooMany);
 }
 
 TEST(NestedValue, AliasThatIsTheResultTextIsNoCircle) {
@@ -63,10 +77,25 @@ TEST(NestedValue, AliasThatIsTheResultTextIsNoCircle) {
 }
 
 TEST(NestedValue, DozensOfLevelsAreFine) {
-  std::string text = "3";
-  for (int i = 0; i < 40; ++i) text = "!calc {x: " + text + ", =: x}";
-  EXPECT_EQ(3.0f, NodeToFloat(yaml(text), {}));
-  EXPECT_TRUE(NodeToBool(yaml(text), {}));
+  EXPECT_EQ(3.0f, NodeToFloat(yaml(nestedMappings(40)), {}));
+  EXPECT_TRUE(NodeToBool(yaml(nestedMappings(40)), {}));
+}
+
+// By way of aliases: the yaml library does not parse that many levels written out.
+TEST(NestedValue, FiveHundredLevelsAreTheMost) {
+  std::string text = "- &x1 3\n";
+  for (int i = 2; i <= 501; ++i) {
+    text += "- &x" + std::to_string(i) + " !calc {v: *x" + std::to_string(i - 1) + ", =: v}\n";
+  }
+  const YAML::Node levels = yaml(text);
+  EXPECT_EQ(3.0f, NodeToFloat(levels[499], {}));
+  expectErrorAtSomePlace([&] { NodeToFloat(levels[500], {}); }, kTooDeep);
+}
+
+TEST(NestedValue, OneHundredThousandValuesAreTheMost) {
+  EXPECT_EQ(3.0f, NodeToFloat(yaml(flatMapping(99999)), {}));
+  const YAML::Node tooMany = yaml("\n" + flatMapping(100000));
+  expectError<Loader::Exception>([&] { NodeToFloat(tooMany, {}); }, {100002, 4}, kTooMany);
 }
 
 TEST(NestedValue, DozensOfDefaultsAreFine) {

@@ -81,8 +81,9 @@ TEST(CalcScalar, EmptyTextIsAMissingNumber) {
 }
 
 TEST(CalcScalar, ExpressionThatWouldNeverEndIsReportedAtTheNode) {
-  expectRefused<Loader::Exception>("!calc 1 + True", {1, 1},
-                                   "expression nested too deeply at '+ True'");
+  expectRefused<Loader::Exception>(
+      "!calc 1 + True", {1, 1},
+      "expression never ends: True or False after an operator at '+ True'");
 }
 
 TEST(CalcScalar, EndsAtAZeroByte) {

@@ -61,14 +61,18 @@ void expectErrorAnywhere(Body body, const std::string &message) {
   }
 }
 
-// BODY must end with the loader's error at a real place, because a value leads too far.
+// The errors of a value that contains too many others, one in the other or in all.
+constexpr const char *kTooDeep = "value nested too deeply";
+constexpr const char *kTooMany = "more than 100000 values in one";
+
+// BODY must end with the loader's error of that message at a real place.
 template <typename Body>
-void expectNestedTooDeeply(Body body) {
+void expectErrorAtSomePlace(Body body, const std::string &message) {
   try {
     body();
-    ADD_FAILURE() << "nothing was thrown";
+    ADD_FAILURE() << "nothing was thrown instead of: " << message;
   } catch (const Loader::Exception &error) {
-    EXPECT_EQ("value nested too deeply", error.msg);
+    EXPECT_EQ(message, error.msg);
     EXPECT_GE(error.mark.line, 0);
     EXPECT_GE(error.mark.column, 0);
   } catch (const std::exception &other) {

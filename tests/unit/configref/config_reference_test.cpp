@@ -157,6 +157,14 @@ TEST_F(ConfigReference, MissingFieldGivesTheDefault) {
   EXPECT_TRUE(flag(reference("yes")));
 }
 
+TEST_F(ConfigReference, RealReadWithoutAValueGivesTheDefault) {
+  store_.objects["k/c/g/"] = {};
+  store_.at = {{"GetValue long", [] { throw InvalidTypeException("another type"); }}};
+  EXPECT_EQ(1024.0f, number(reference("1024")));
+  EXPECT_TRUE(flag(reference("yes")));
+  EXPECT_EQ("GetValue double size", store_.calls.back());
+}
+
 TEST_F(ConfigReference, FieldThatNeitherReadTakesGivesTheDefault) {
   hold("text");
   EXPECT_EQ(1024.0f, number(reference("1024")));
@@ -399,6 +407,8 @@ TEST_F(ConfigReference, ObjectWithoutAValueLeavesEveryPartEmpty) {
   number("!config {object: ~, key: f, default: 1}");
   EXPECT_EQ("GetObject ///", store_.calls.back());
   number("!config\nobject:\nkey: f\ndefault: 1\n");
+  EXPECT_EQ("GetObject ///", store_.calls.back());
+  number("!config {object: !foo ~, key: f, default: 1}");
   EXPECT_EQ("GetObject ///", store_.calls.back());
 }
 

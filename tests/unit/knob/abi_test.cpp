@@ -29,15 +29,18 @@ void *operator new(size_t size) {
   if (void *memory = std::malloc(size == 0 ? 1 : size)) return memory;
   throw std::bad_alloc();
 }
+
 void *operator new(size_t size, const std::nothrow_t &) noexcept {
   if (allocationsLeft == 0) return nullptr;
   if (allocationsLeft > 0) --allocationsLeft;
   return std::malloc(size == 0 ? 1 : size);
 }
+
 // Inlined beside a call of operator new, a free() would look like the wrong partner of it.
 [[gnu::noinline]] void operator delete(void *memory) noexcept {
   std::free(memory);
 }
+
 [[gnu::noinline]] void operator delete(void *memory, size_t) noexcept {
   std::free(memory);
 }

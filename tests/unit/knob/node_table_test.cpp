@@ -11,6 +11,7 @@
 #include "fake_kernel.h"
 #include "knob/node_ids.h"
 #include "knob/param_list.h"
+#include "platform/knob_records.h"
 
 namespace Knob {
 namespace {
@@ -21,12 +22,15 @@ KNOB_ParamList list(ListKind kind, std::vector<ListEntry> entries) {
   const size_t size = entries.size();
   return {kind, size, std::move(entries)};
 }
+
 KNOB_ParamList group(int64_t id = 5) {
   return list(ListKind::kInstance, {id});
 }
+
 KNOB_ParamList input(std::vector<ListEntry> entries) {
   return list(ListKind::kInput, std::move(entries));
 }
+
 ListEntry text(const char *bytes) {
   return std::string(bytes);
 }
@@ -236,29 +240,32 @@ TEST_F(NodeTable, MemoryOfTheTopBitIsNotNegative) {
   EXPECT_EQ(at<uint64_t>(output_, 0), uint64_t{1} << 63);
 }
 
-TEST_F(NodeTable, AllocationsStandInTheirRecordsOrder) {
+TEST_F(NodeTable, AllocationsFillTheirRecords) {
   kernel_.allocation = {1, 2, 3, 4};  // min, max, minLimit, shares
   const KNOB_ParamList instance = group();
-  getNode(kernel_, kMemAllocationNode, &instance, output_.data(), 36);
-  EXPECT_EQ(at<int64_t>(output_, 0), 1);
-  EXPECT_EQ(at<int64_t>(output_, 8), 2);
-  EXPECT_EQ(at<int64_t>(output_, 16), 4);
-  EXPECT_EQ(at<int64_t>(output_, 24), 3);
-  EXPECT_EQ(at<uint32_t>(output_, 32), 0U);
-  getNode(kernel_, kCpuAllocationNode, &instance, output_.data(), 20);
-  EXPECT_EQ(at<int32_t>(output_, 0), 1);
-  EXPECT_EQ(at<int32_t>(output_, 4), 2);
-  EXPECT_EQ(at<int32_t>(output_, 8), 4);
-  EXPECT_EQ(at<int32_t>(output_, 12), 3);
-  EXPECT_EQ(at<uint32_t>(output_, 16), 0U);
+  KNOB_MemAllocation memory;
+  getNode(kernel_, kMemAllocationNode, &instance, &memory, sizeof memory);
+  EXPECT_EQ(memory.min, 1);
+  EXPECT_EQ(memory.max, 2);
+  EXPECT_EQ(memory.minLimit, 3);
+  EXPECT_EQ(memory.shares, 4);
+  EXPECT_EQ(memory.reserved32, 0U);
+  KNOB_CpuAllocation cpu;
+  getNode(kernel_, kCpuAllocationNode, &instance, &cpu, sizeof cpu);
+  EXPECT_EQ(cpu.min, 1);
+  EXPECT_EQ(cpu.max, 2);
+  EXPECT_EQ(cpu.minLimit, 3);
+  EXPECT_EQ(cpu.shares, 4);
+  EXPECT_EQ(cpu.reserved16, 0U);
 }
 
-TEST_F(NodeTable, AnOutputMayStandAtAnyAddress) {
+TEST_F(NodeTable, AnOutputMayBeAtAnyAddress) {
   kernel_.statistics = {123, 456};
   const KNOB_ParamList instance = group();
-  getNode(kernel_, kMemoryStatsNode, &instance, output_.data() + 1, 382);
-  EXPECT_EQ(at<uint64_t>(output_, 1 + 309), 123U);
-  EXPECT_EQ(at<uint64_t>(output_, 1 + 374), 456U);
+  getNode(kernel_, kMemoryStatsNode, &instance, output_.data() + 1, sizeof(KNOB_MemoryStats));
+  const auto stats = at<KNOB_MemoryStats>(output_, 1);
+  EXPECT_EQ(stats.ownReservedPeakKB, 123U);
+  EXPECT_EQ(stats.childrenReservedPeakKB, 456U);
 }
 
 TEST_F(NodeTable, ArgumentsReachTheKernel) {

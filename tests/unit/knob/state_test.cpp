@@ -324,7 +324,7 @@ class Check : public State {
   }
 
   // What the check finds after the state was changed behind the kernel's back: exactly this, first
-  // as it is, then mended, then no more.
+  // as it is, then repaired, then no more.
   void expectFound(const char *sql, const std::string &path, const std::string &text) {
     execute(sql);
     for (const bool repair : {false, true}) {
@@ -332,7 +332,7 @@ class Check : public State {
       ASSERT_FALSE(findings.empty());
       EXPECT_EQ(findings.front().path, path);
       EXPECT_THAT(findings.front().text, HasSubstr(text));
-      EXPECT_EQ(findings.front().mended, repair);
+      EXPECT_EQ(findings.front().repaired, repair);
     }
     EXPECT_TRUE(open()->check(false).empty());
   }
@@ -384,7 +384,7 @@ TEST_F(Check, ABrokenFileIsFoundAndNotMended) {
   const auto findings = open()->check(true);
   ASSERT_EQ(findings.size(), 1U);
   EXPECT_THAT(findings.front().text, HasSubstr("the state is damaged"));
-  EXPECT_FALSE(findings.front().mended);
+  EXPECT_FALSE(findings.front().repaired);
 }
 
 TEST_F(Check, AViewHoldsWhatPeopleAreShown) {

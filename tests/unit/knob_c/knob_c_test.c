@@ -2,9 +2,10 @@
 /* The interface as a program in C uses it: every function and every node, once. */
 #include <inttypes.h>
 #include <stdio.h>
-#include <string.h>
 
 #include "platform/knob.h"
+#include "platform/knob_records.h"
+#include "platform/knob_status.h"
 
 static int failures = 0;
 
@@ -31,11 +32,17 @@ static KNOB_ParamList *inputOf(const char *text) {
 }
 
 static void readFacts(void) {
-  char record[4096];
-  expectSuccess(KNOB_Get(KNOB_NODE_hardware_cpu_cpuInfo, NULL, record, 38), "cpuInfo");
-  expectSuccess(KNOB_Get(KNOB_NODE_system_vmLimits, NULL, record, 32), "vmLimits");
-  expectSuccess(KNOB_Get(KNOB_NODE_system_bootCmdLine, NULL, record, 4096), "bootCmdLine");
-  expectSuccess(KNOB_Get(KNOB_NODE_memory_comprehensive, NULL, record, 80), "comprehensive");
+  KNOB_CpuInfo cpu;
+  KNOB_VmLimits limits;
+  KNOB_BootCommandLine line;
+  KNOB_MemoryInfo memory;
+  expectSuccess(KNOB_Get(KNOB_NODE_hardware_cpu_cpuInfo, NULL, &cpu, sizeof cpu), "cpuInfo");
+  expectSuccess(KNOB_Get(KNOB_NODE_system_vmLimits, NULL, &limits, sizeof limits), "vmLimits");
+  expectSuccess(KNOB_Get(KNOB_NODE_system_bootCmdLine, NULL, &line, sizeof line), "bootCmdLine");
+  expectSuccess(KNOB_Get(KNOB_NODE_memory_comprehensive, NULL, &memory, sizeof memory),
+                "comprehensive");
+  expect(cpu.cpus > 0, "a machine with a CPU", 0);
+  expect(memory.physicalKB > 0, "a machine with memory", 0);
 }
 
 static int64_t makeGroup(void) {
@@ -55,8 +62,9 @@ static int64_t makeGroup(void) {
 }
 
 static void useGroup(int64_t group) {
-  char record[382];
-  int64_t min = 0;
+  KNOB_MemAllocation mem;
+  KNOB_CpuAllocation cpu;
+  KNOB_MemoryStats stats;
   KNOB_ParamList *instance = instanceOf(group);
   KNOB_ParamList *settings = inputOf("min=3");
   KNOB_ParamList *pid = KNOB_ParamListCreate(0, 1);
@@ -64,16 +72,18 @@ static void useGroup(int64_t group) {
                 "set memory");
   expectSuccess(KNOB_Set(KNOB_NODE_sched_groups_cpuAllocationInPct, instance, settings, NULL, 0),
                 "set CPU");
-  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance, record, 36),
+  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_memAllocationInMB, instance, &mem, sizeof mem),
                 "read memory");
-  memcpy(&min, record, sizeof(min));
-  expect(min == 3, "the memory that was set", 0);
-  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_cpuAllocationInPct, instance, record, 20),
+  expect(mem.min == 3, "the memory that was set", 0);
+  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_cpuAllocationInPct, instance, &cpu, sizeof cpu),
                 "read CPU");
-  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_stats_memoryStats, instance, record, 382),
+  expect(cpu.min == 3, "the CPU that was set", 0);
+  expectSuccess(KNOB_Get(KNOB_NODE_sched_groups_stats_memoryStats, instance, &stats, sizeof stats),
                 "memoryStats");
+  expect(stats.ownReservedPeakKB == 3072, "the peak of the memory that was set", 0);
   expectSuccess(KNOB_ParamListAddInt(pid, -1), "KNOB_ParamListAddInt");
-  expect(KNOB_Set(KNOB_NODE_sched_groups_members_worlds, instance, pid, NULL, 0) == 0x0BAD0003,
+  expect(KNOB_Set(KNOB_NODE_sched_groups_members_worlds, instance, pid, NULL, 0) ==
+             KNOB_STATUS_NOT_FOUND,
          "no process of that id", 0);
   KNOB_ParamListDestroy(instance);
   KNOB_ParamListDestroy(settings);

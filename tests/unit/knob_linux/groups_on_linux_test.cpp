@@ -144,7 +144,7 @@ class OnLinux : public testing::Test {
   std::vector<std::string> check(bool repair) {
     std::vector<std::string> lines;
     for (const Finding &finding : kernel_->check(repair)) {
-      lines.push_back(finding.path + ": " + finding.text + (finding.mended ? " (mended)" : ""));
+      lines.push_back(finding.path + ": " + finding.text + (finding.repaired ? " (repaired)" : ""));
     }
     return lines;
   }
@@ -241,7 +241,7 @@ TEST_F(OnLinux, AMaximumThatLivingProcessesExceedIsToldAndNotForced) {
   const Member member("host/opt/pool", 50);
   const auto findings = kernel_->check(true);
   ASSERT_EQ(findings.size(), 1U);
-  EXPECT_FALSE(findings[0].mended);
+  EXPECT_FALSE(findings[0].repaired);
   EXPECT_THAT(findings[0].text, HasSubstr("living processes hold"));
   EXPECT_EQ(fileText("host/opt/pool", "memory.max"), "max");
   EXPECT_EQ(fileText("host/opt/pool", "memory.high"), "max");
@@ -275,9 +275,9 @@ TEST_F(OnLinux, WrongSumsAreRecounted) {
   const auto lines = check(true);
   EXPECT_THAT(
       lines, testing::Contains("host/opt: its children reserve 10 MB of memory, its record says 99 "
-                               "(mended)"));
+                               "(repaired)"));
   EXPECT_THAT(lines, testing::Contains("host/opt: its children reserve 20 percent of CPU, its "
-                                       "record says 0 (mended)"));
+                                       "record says 0 (repaired)"));
   EXPECT_TRUE(check(false).empty());
 }
 

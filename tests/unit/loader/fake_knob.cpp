@@ -5,6 +5,8 @@
 #include <algorithm>
 #include <cstring>
 
+#include "platform/knob_records.h"
+
 extern "C" {
 extern const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo = 101;
 extern const KNOB_NodeID KNOB_NODE_system_vmLimits = 102;
@@ -14,15 +16,17 @@ extern const KNOB_NodeID KNOB_NODE_memory_comprehensive = 104;
 
 namespace {
 
+// The records are packed, so they may be at any address.
 void fill(const FakeKnob &knob, KNOB_NodeID node, char *record, size_t size) {
   std::memset(record, knob.filler, size);
   if (node == KNOB_NODE_hardware_cpu_cpuInfo) {
-    std::memcpy(record + 24, &knob.physicalCpus, sizeof knob.physicalCpus);
-    std::memcpy(record + 36, &knob.isVm, sizeof knob.isVm);
+    auto *cpu = reinterpret_cast<KNOB_CpuInfo *>(record);
+    cpu->cpus = knob.physicalCpus;
+    cpu->isVm = knob.isVm;
   } else if (node == KNOB_NODE_system_vmLimits) {
-    std::memcpy(record, &knob.maxVMs, sizeof knob.maxVMs);
+    reinterpret_cast<KNOB_VmLimits *>(record)->maxVms = knob.maxVMs;
   } else if (node == KNOB_NODE_memory_comprehensive) {
-    std::memcpy(record, &knob.physKB, sizeof knob.physKB);
+    reinterpret_cast<KNOB_MemoryInfo *>(record)->physicalKB = knob.physKB;
   } else {
     const size_t length = std::min(knob.commandLine.size(), size);
     std::memcpy(record, knob.commandLine.data(), length);

@@ -58,6 +58,7 @@ void expectRefused(const std::string &text, Place place, const std::string &mess
 int64_t memMax(const std::string &value) {
   return poolWith("memMax: " + value).mem.max;
 }
+
 int32_t cpuMax(const std::string &value) {
   return poolWith("cpuMax: " + value).cpu.max;
 }
@@ -187,6 +188,22 @@ TEST(PoolNumber, CpuTakesEveryFloatBelowTheTopOfItsRange) {
   EXPECT_EQ(2147483520, cpuMax("2147483520"));
   EXPECT_EQ(-2147483520, cpuMax("-2147483520"));
   EXPECT_EQ(kLowest32, cpuMax("-2147483648"));
+}
+
+// 2^40 is a float; cut to 32 bits it would be 0.
+TEST(PoolNumber, EveryMemoryKeyHasSixtyFourBits) {
+  constexpr int64_t kBig = int64_t{1} << 40;
+  expectMem(poolWith("mem: 1099511627776"), kBig, kBig, -1, -1);
+  expectMem(poolWith("memMin: 1099511627776"), kBig, -1, -1, -1);
+  expectMem(poolWith("memMax: 1099511627776"), 0, kBig, -1, -1);
+  expectMem(poolWith("memMinLimit: 1099511627776"), 0, -1, -1, kBig);
+  expectMem(poolWith("memShares: 1099511627776"), 0, -1, kBig, -1);
+}
+
+TEST(PoolNumber, EveryCpuKeyOutOfRangeGivesTheLowestValue) {
+  expectCpu(poolWith("cpuMin: 1099511627776"), kLowest32, -1, 1000);
+  expectCpu(poolWith("cpuMax: 1099511627776"), 0, kLowest32, 1000);
+  expectCpu(poolWith("cpuShares: 1099511627776"), 0, -1, kLowest32);
 }
 
 TEST(PoolNumber, CpuOutOfRangeGivesTheLowestValue) {

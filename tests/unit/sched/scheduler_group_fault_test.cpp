@@ -101,6 +101,18 @@ TEST_F(SchedFaults, CreateTakesTheGroupBackWhenAnAllocationCannotBeSet) {
   EXPECT_EQ(whatWhenCallFails(nth, createPool), "") << "more calls than expected";
 }
 
+TEST_F(SchedFaults, EveryStatusButZeroIsAFailure) {
+  for (const std::string status :
+       {"0x00000001", "0x0bacffff", "0x0bad0000", "0x0bad0001", "0x80000000", "0xffffffff"}) {
+    writeFile(world.environment.at("RECORDING_KNOB_SCRIPT"),
+              "fail function=KNOB_Set status=" + status + "\n");
+    const auto failure = failureOf([] { ::Sched::pathNameToId("host"); });
+    ASSERT_TRUE(failure) << status;
+    EXPECT_EQ(failure->status, std::stoul(status, nullptr, 16));
+    EXPECT_EQ(failure->what(), "KNOB_Set: status " + status);
+  }
+}
+
 TEST_F(SchedFaults, CreateCarriesTheStatusOfTheRefusedSet) {
   world.knob("fail node=sched_groups_cpuAllocationInPct status=0x0bad00f5");
   const auto failure = failureOf(createPool);

@@ -34,7 +34,7 @@ TEST_F(Sched, MemoryIsReadIntoTheRecordAsTheKernelWroteIt) {
   EXPECT_EQ(record.max, 4294967296);
   EXPECT_EQ(record.minLimit, -1);
   EXPECT_EQ(record.shares, -3);
-  EXPECT_EQ(record.kernelWord, 0xA5A5A5A5u);
+  EXPECT_EQ(record.reserved32, 0xA5A5A5A5u);
   EXPECT_EQ(
       world.everyCall(),
       (Calls{"KNOB_ParamListCreate kind=1 capacity=1 -> #1", "KNOB_ParamListAddInt #1 11 -> 0",
@@ -50,7 +50,7 @@ TEST_F(Sched, CpuIsReadIntoTheRecordAsTheKernelWroteIt) {
   EXPECT_EQ(record.max, 150);
   EXPECT_EQ(record.minLimit, 7);
   EXPECT_EQ(record.shares, 1000);
-  EXPECT_EQ(record.kernelWord, 0xA5A5A5A5u);
+  EXPECT_EQ(record.reserved16, 0xA5A5A5A5u);
   EXPECT_EQ(
       world.everyCall(),
       (Calls{"KNOB_ParamListCreate kind=1 capacity=1 -> #1", "KNOB_ParamListAddInt #1 11 -> 0",
@@ -94,6 +94,18 @@ TEST_F(Sched, AnAllZeroMemoryRecordSendsItsSharesToo) {
   EXPECT_EQ(world.groupCalls(),
             Calls{"KNOB_Set sched_groups_memAllocationInMB instance=[2] "
                   "input=[\"min=0\",\"max=0\",\"minLimit=0\",\"shares=0\"] output=0 -> 0"});
+}
+
+TEST_F(Sched, SettingsOfMinusOneAreSentButForTheShares) {
+  succeed([] {
+    ::Sched::setMemAllocation(2, mem(-1, -1, -1, -1));
+    ::Sched::setCpuAllocation(2, cpu(-1, -1, -1, -1));
+  });
+  EXPECT_EQ(world.groupCalls(),
+            (Calls{"KNOB_Set sched_groups_memAllocationInMB instance=[2] "
+                   "input=[\"min=-1\",\"max=-1\",\"minLimit=-1\"] output=0 -> 0",
+                   "KNOB_Set sched_groups_cpuAllocationInPct instance=[2] "
+                   "input=[\"min=-1\",\"max=-1\",\"minLimit=-1\"] output=0 -> 0"}));
 }
 
 TEST_F(Sched, MemorySettingsKeepTheirSixtyFourBits) {
