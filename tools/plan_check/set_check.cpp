@@ -39,14 +39,18 @@ class SetCheck {
     for (const DeclaredPool *declared : pools_) byPath_.emplace(path(*declared), declared);
   }
 
-  Findings run() {
+  enum class Also { kNothing, kGroupsAsTheyAre };
+
+  Findings run(Also also) {
     checkDuplicates();
     for (const DeclaredPool *declared : pools_) {
       checkEmpty(*declared);
       if (machine_.isKnown) checkValues(*declared);
     }
     checkLoad(afterStart(), "");
-    if (groups_ && machine_.isKnown) checkLoad(asItIs(), " with the groups as they are now");
+    if (also == Also::kGroupsAsTheyAre && groups_ && machine_.isKnown) {
+      checkLoad(asItIs(), " with the groups as they are now");
+    }
     return std::move(findings_);
   }
 
@@ -285,7 +289,13 @@ std::vector<const DeclaredPool *> inLoadOrder(const std::vector<DeclaredPool> &p
 
 Findings checkSet(const std::vector<DeclaredPool> &pools, const Machine &machine,
                   const std::optional<std::vector<KernelGroup>> &groups) {
-  return SetCheck(pools, machine, groups).run();
+  return SetCheck(pools, machine, groups).run(SetCheck::Also::kGroupsAsTheyAre);
+}
+
+Findings checkSetAfterStart(const std::vector<DeclaredPool> &pools, const Machine &machine,
+                            const std::vector<KernelGroup> &groups) {
+  const std::optional<std::vector<KernelGroup>> known = groups;
+  return SetCheck(pools, machine, known).run(SetCheck::Also::kNothing);
 }
 
 }  // namespace Plan

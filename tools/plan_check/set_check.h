@@ -25,4 +25,9 @@ std::vector<const DeclaredPool *> inLoadOrder(const std::vector<DeclaredPool> &p
 Findings checkSet(const std::vector<DeclaredPool> &pools, const Machine &machine,
                   const std::optional<std::vector<KernelGroup>> &groups);
 
+// Only what a machine that has just started would find: beside the declared pools there are the
+// groups that no definition declares.
+Findings checkSetAfterStart(const std::vector<DeclaredPool> &pools, const Machine &machine,
+                            const std::vector<KernelGroup> &groups);
+
 }  // namespace Plan
