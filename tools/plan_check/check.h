@@ -32,6 +32,18 @@ struct Checked {
   Sources sources;
 };
 
+// A file, and the name that findings give it.
+struct NamedFile {
+  std::string name;
+  std::string path;
+};
+
+Checked checkFiles(const std::vector<NamedFile> &files, const Surroundings &surroundings);
 Checked checkFiles(const std::vector<std::string> &paths, const Surroundings &surroundings);
+
+// What is found in AFTER that concerns the files of these names: their own findings, and errors of
+// other files that are not in BEFORE.
+Findings findingsOfChange(const Checked &before, const Checked &after,
+                          const std::vector<std::string> &names);
 
 }  // namespace Plan

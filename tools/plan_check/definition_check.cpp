@@ -369,9 +369,9 @@ class FileCheck {
 
 }  // namespace
 
-CheckedFile checkText(const std::string &path, std::string text, const Calc::VariableTable &facts) {
+CheckedFile checkText(const std::string &name, std::string text, const Calc::VariableTable &facts) {
   CheckedFile result;
-  result.source = std::make_shared<const SourceFile>(path, std::move(text));
+  result.source = std::make_shared<const SourceFile>(name, std::move(text));
   FileCheck(&result, facts).run();
   std::stable_sort(
       result.findings.begin(), result.findings.end(), [](const Finding &a, const Finding &b) {
@@ -380,16 +380,17 @@ CheckedFile checkText(const std::string &path, std::string text, const Calc::Var
   return result;
 }
 
-CheckedFile checkFile(const std::string &path, const Calc::VariableTable &facts) {
+CheckedFile checkFile(const std::string &path, const std::string &name,
+                      const Calc::VariableTable &facts) {
   std::ifstream stream(path, std::ios::binary);
   std::error_code unknown;
   if (stream && !std::filesystem::is_directory(path, unknown)) {
     std::string text((std::istreambuf_iterator<char>(stream)), {});
-    return checkText(path, std::move(text), facts);
+    return checkText(name, std::move(text), facts);
   }
   CheckedFile result;
-  result.source = std::make_shared<const SourceFile>(path, "");
-  result.findings.push_back({Severity::kError, "unreadable", path, Place(), "",
+  result.source = std::make_shared<const SourceFile>(name, "");
+  result.findings.push_back({Severity::kError, "unreadable", name, Place(), "",
                              "the file cannot be read", "", "", false});
   return result;
 }

@@ -29,11 +29,12 @@ struct CheckedFile {
   std::vector<DeclaredPool> pools;
 };
 
-// A file that cannot be read is a finding.
-CheckedFile checkFile(const std::string &path, const Calc::VariableTable &facts);
+// A file that cannot be read is a finding. NAME: what findings call the file.
+CheckedFile checkFile(const std::string &path, const std::string &name,
+                      const Calc::VariableTable &facts);
 
-// The same for a text. PATH: for the findings.
-CheckedFile checkText(const std::string &path, std::string text, const Calc::VariableTable &facts);
+// The same for a text.
+CheckedFile checkText(const std::string &name, std::string text, const Calc::VariableTable &facts);
 
 // The place of the key, or of the item where the pool does not have the key.
 Place placeOfKey(const DeclaredPool &pool, const std::string &key);

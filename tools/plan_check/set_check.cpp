@@ -241,14 +241,19 @@ class SetCheck {
     const ResourcePoolImpl &pool = *declared.pool;
     const auto memory = tree->set(pool.name, Resource::kMemory, memoryChange(pool));
     if (memory) {
-      refuse(declared, keyOf(declared, "memMin"), "no-room",
+      refuse(declared, keyOf(declared, "memMin"), codeOf(when),
              "the memory does not fit" + when + ": " + *memory);
       return;
     }
     const auto cpu = tree->set(pool.name, Resource::kCpu, cpuChange(pool));
     if (cpu) {
-      refuse(declared, "cpuMin", "no-room", "the CPU does not fit" + when + ": " + *cpu);
+      refuse(declared, "cpuMin", codeOf(when), "the CPU does not fit" + when + ": " + *cpu);
     }
+  }
+
+  // A set that only the present groups leave no room for can be applied, though not loaded.
+  static std::string codeOf(const std::string &when) {
+    return when.empty() ? "no-room" : "no-room-now";
   }
 
   const std::vector<const DeclaredPool *> pools_;

@@ -14,10 +14,10 @@
 #include <string>
 
 #include "knob/session.h"
+#include "plan_check/comparison.h"
 #include "plan_check/report.h"
 #include "plan_check/set_check.h"
 #include "platform/knob.h"
-#include "poolctl_plan/comparison.h"
 #include "poolctl_plan/execution.h"
 #include "poolctl_plan/explanation.h"
 #include "poolctl_plan/fact_tests.h"

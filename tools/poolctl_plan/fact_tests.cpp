@@ -81,7 +81,7 @@ class Runner {
   explicit Runner(const std::vector<std::string> &files) {
     const Machine machine = unknownMachine();
     for (const std::string &path : files) {
-      const CheckedFile checked = checkFile(path, machine.facts);
+      const CheckedFile checked = checkFile(path, path, machine.facts);
       for (const Finding &finding : checked.findings) {
         if (finding.severity == Severity::kError && !finding.isAtLoad) {
           throw std::runtime_error(path + ": has errors; poolctl-plan check reports them");

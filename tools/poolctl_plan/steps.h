@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
+#include "plan_check/comparison.h"
 #include "plan_check/machine.h"
-#include "poolctl_plan/comparison.h"
 
 namespace Plan {
 

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Comparing and laying out are separate functions, so that both can be used alone.
-#include "poolctl_plan/comparison.h"
+#include "plan_check/comparison.h"
 
 #include <algorithm>
 #include <array>
