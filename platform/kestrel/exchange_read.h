@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads the exchange format of whole stores: YAML, a sequence of objects. The form of a plain scalar
-// decides its type, as on kestrelctl's command line; a quoted one is a text.
+// Reads the exchange format of whole stores: YAML, a sequence of objects. The form of a plain
+// scalar decides its type, as on kestrelctl's command line; a quoted one is a text.
 #pragma once
 
 #include <stdexcept>
