@@ -16,4 +16,8 @@ std::string groupPath(const std::string &pool);
 // was.
 void joinGroup(const std::string &path);
 
+// Gives the calling process an oom_score_adj, -1000 to 1000, which the command keeps. Throws
+// std::system_error.
+void setOomScoreAdj(int value);
+
 }  // namespace Exec

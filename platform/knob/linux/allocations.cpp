@@ -9,6 +9,7 @@
 #include "knob/admission.h"
 #include "knob/allocation.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/peaks.h"
 
 namespace Knob::Linux {
@@ -125,6 +126,22 @@ void AllocationManager::apply(Group &group, const StoredRecord &stored, Resource
     for (const Ancestor &ancestor : ancestors) writeAncestor(writes, ancestor);
   }
   writes.commit();
+  protectMembers(group, stored.record, after);
+}
+
+int AllocationManager::oomScoreAdj(const Record &record) const {
+  return oomScoreAdjFor(record.memory.allocation.min, oomMachineBytes());
+}
+
+// Without the right to lower a value the minimum still protects from reclaim; check() reports it.
+void AllocationManager::protectMembers(const Group &group, const Record &before,
+                                       const Record &after) const {
+  const int64_t formerMin = before.memory.allocation.min, min = after.memory.allocation.min;
+  if (min == formerMin) return;
+  if ((min == 0) != (formerMin == 0)) markForOomd(group.fd(), min != 0);
+  for (const int64_t pid : readMembers(group.fd())) {
+    (void)changeOomScoreAdj(pid, oomScoreAdj(before), oomScoreAdj(after));
+  }
 }
 
 // Reads the ancestors of a group as far as their sums change, the parent first, and puts the sums

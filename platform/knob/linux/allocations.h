@@ -38,6 +38,9 @@ class AllocationManager {
   // The control files that differ from the record. Needs no more than the shared lock.
   std::vector<Deviation> deviations(const Group &group, const Record &record) const;
 
+  // The oom_score_adj that the members of a group get.
+  int oomScoreAdj(const Record &record) const;
+
   int64_t capacity(Resource resource) const { return machineCapacity(facts_, resource); }
 
  private:
@@ -53,6 +56,7 @@ class AllocationManager {
   bool countForeignMinimum(Group &group, const StoredRecord &stored);
   StoredRecord readToChange(Group &group);
   void apply(Group &group, const StoredRecord &stored, Resource resource, const Allocation &wanted);
+  void protectMembers(const Group &group, const Record &before, const Record &after) const;
   void admitInto(std::vector<Ancestor> &ancestors, Group &group, Resource resource,
                  const ResourceState &own, const Allocation &wanted);
   ControlTexts currentTexts(const Group &group, const StoredRecord &stored,

@@ -31,7 +31,7 @@ constexpr mode_t kDirectoryMode = 0755;
 constexpr nlink_t kLinksOfALeaf = 2;
 constexpr size_t kMaxOpenGroups = 48;
 constexpr size_t kMaxKnownPaths = 64;
-constexpr size_t kMaxStatBytes = 4096;
+constexpr size_t kMaxProcBytes = 16384;
 static_assert(sizeof(ino_t) == sizeof(GroupId), "an inode number is a group's id");
 
 // In one write: in a group with processes "+cpu" alone would succeed and make it a threaded one.
@@ -47,15 +47,20 @@ bool hasControllers(const Group &group) {
          hasControl(group.fd(), infoOf(Control::kCpuMax).name);
 }
 
-bool isAlive(const std::string &pid) {
+// Empty when the process has ended.
+std::string procText(int64_t pid, const char *file) {
   try {
-    const std::string stat = Platform::readFile("/proc/" + pid + "/stat", kMaxStatBytes);
-    // "PID (NAME) STATE ...": the name may contain parentheses too.
-    const size_t state = stat.rfind(") ") + 2;
-    return state < stat.size() && stat[state] != 'Z' && stat[state] != 'X';
+    return Platform::readFile("/proc/" + std::to_string(pid) + "/" + file, kMaxProcBytes);
   } catch (const std::system_error &) {
-    return false;
+    return {};
   }
+}
+
+bool isAlive(int64_t pid) {
+  const std::string stat = procText(pid, "stat");
+  // "PID (NAME) STATE ...": the name may contain parentheses too.
+  const size_t state = stat.rfind(") ") + 2;
+  return state < stat.size() && stat[state] != 'Z' && stat[state] != 'X';
 }
 
 std::string_view lastComponent(std::string_view path) {
@@ -351,7 +356,22 @@ void CgroupTree::addMember(Group &group, int64_t pid) {
   }
   if (error != 0) fail(error, "cannot move process " + text);
   // Linux accepts a zombie and leaves it where it is.
-  if (!isAlive(text)) throw KernelError(Status::kNotFound, "no such process");
+  if (!isAlive(pid)) throw KernelError(Status::kNotFound, "no such process");
+}
+
+// The path in /proc begins at the root of the cgroup namespace, which need not be the mount's. So
+// the part from host on is looked up, and the members of that group decide.
+GroupPtr CgroupTree::groupOf(int64_t pid) {
+  const std::string text = procText(pid, "cgroup");
+  const size_t line = text.rfind("0::/");
+  const size_t slash =
+      line == std::string::npos ? line : text.find("/" + std::string(kRootName), line);
+  if (slash == std::string::npos) return {};
+  const std::string path = text.substr(slash + 1, text.find('\n', slash) - slash - 1);
+  GroupPtr group = splitPath(path) ? lookUp(path) : GroupPtr();
+  if (!group) return {};
+  const std::vector<int64_t> pids = readMembers(group->fd());
+  return std::find(pids.begin(), pids.end(), pid) == pids.end() ? GroupPtr() : group;
 }
 
 void CgroupTree::write(Group &group, Control control, std::string_view text) {

@@ -80,6 +80,9 @@ class CgroupTree {
   // Whether living processes are in the group or below it.
   bool isPopulated(const Group &group) const;
 
+  // The group that a process is in; empty when it is not in the tree, or has ended.
+  GroupPtr groupOf(int64_t pid);
+
   // Moves a process into a group without child groups. Throws KernelError: not found (no such
   // living process), bad parameter (a kernel thread).
   void addMember(Group &group, int64_t pid);

@@ -7,6 +7,7 @@
 
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
 #include "knob/signature.h"
@@ -76,6 +77,7 @@ class Checker {
       }
       if (!stored.isStored) return;
       checkFiles(entry, *group, stored.record);
+      checkMembers(entry, *group, stored.record);
       addToParent(entry, stored.record);
     });
   }
@@ -163,6 +165,22 @@ class Checker {
       if (error.status == Status::kNotFound) throw;
       return std::string(": ") + error.what();
     }
+  }
+
+  // Processes that another program moved in.
+  void checkMembers(const Entry &entry, const Group &group, const Record &record) {
+    const int wanted = allocations_.oomScoreAdj(record);
+    if (wanted == 0) return;
+    const std::vector<int64_t> without = withoutOomScoreAdj(readMembers(group.fd()), wanted);
+    if (without.empty()) return;
+    bool repaired = repair_;
+    for (const int64_t pid : without) {
+      repaired = repaired && changeOomScoreAdj(pid, 0, wanted);
+    }
+    report(entry.path,
+           std::to_string(without.size()) + " of its processes lack the oom_score_adj of " +
+               std::to_string(wanted) + " that its minimum asks for",
+           repaired);
   }
 
   void checkMachine(int64_t memory, int64_t cpu) {

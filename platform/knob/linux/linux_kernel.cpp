@@ -15,6 +15,7 @@
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/hierarchy.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/machine_facts.h"
 #include "knob/names.h"
@@ -111,7 +112,9 @@ class LinuxKernel final : public Kernel {
     if (tree_.hasChildren(*group)) throw KernelError(Status::kBusy, "the group has child groups");
     // Linux would move the process, and kill it as soon as it needs a page.
     requireAnyMemory(group);
+    const int former = oomScoreAdjFromUs(pid);
     tree_.addMember(*group, pid);
+    (void)changeOomScoreAdj(pid, former, allocations_.oomScoreAdj(readRecord(group->fd()).record));
   }
 
   MemoryStatistics memoryStatistics(GroupId id) override {
@@ -163,6 +166,13 @@ class LinuxKernel final : public Kernel {
                           "the memory maximum of " + tree_.nameOf(*group) + " is 0");
       }
     }
+  }
+
+  // The oom_score_adj that a process got when it joined the group that it is in now.
+  int oomScoreAdjFromUs(int64_t pid) {
+    if (readOomScoreAdj(pid).value_or(0) == 0) return 0;
+    const GroupPtr group = tree_.groupOf(pid);
+    return group ? allocations_.oomScoreAdj(readRecord(group->fd()).record) : 0;
   }
 
   // For a caller that reports an earlier error.

@@ -26,6 +26,7 @@
 #include "knob/linux/cgroup_tree.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/linux_kernel.h"
+#include "knob/linux/oom_score.h"
 #include "knob/linux/record.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/signature.h"
@@ -99,6 +100,7 @@ class Member {
     ::kill(pid_, SIGKILL);
     ::waitpid(pid_, nullptr, 0);
   }
+  pid_t pid() const { return pid_; }
   Member(const Member &) = delete;
   Member &operator=(const Member &) = delete;
 
@@ -586,6 +588,64 @@ TEST_F(OnLinux, AnotherInterfaceNeedsRepairOrATreeWithoutPools) {
 TEST_F(OnLinux, ReadingTheSignatureMakesNoGroup) {
   EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
   EXPECT_FALSE(std::filesystem::exists(kMount / "host"));
+}
+
+// ---- the machine out of memory
+
+int adjOf(pid_t pid) {
+  std::ifstream file("/proc/" + std::to_string(pid) + "/oom_score_adj");
+  int value = 1;
+  file >> value;
+  return value;
+}
+
+int adjFor(int64_t minMB) {
+  return oomScoreAdjFor(minMB, oomMachineBytes());
+}
+
+TEST_F(OnLinux, MembersFollowTheMinimumOfTheirGroup) {
+  const GroupId id = create("host/opt", "pool");
+  const Member member("");
+  kernel_->join(id, member.pid());
+  EXPECT_EQ(adjOf(member.pid()), 0);
+  for (const int64_t min : {20, 60, 10, 0}) {
+    setMemory(id, min, -1);
+    EXPECT_EQ(adjOf(member.pid()), adjFor(min)) << min;
+  }
+  EXPECT_LT(adjFor(20), 0);
+}
+
+TEST_F(OnLinux, AProcessThatMovesGetsTheValueOfItsNewGroup) {
+  const GroupId large = create("host/opt", "large"), small = create("host/opt", "small");
+  const GroupId none = create("host/opt", "none");
+  setMemory(large, 60, -1);
+  setMemory(small, 20, -1);
+  const Member member("");
+  for (const auto &[id, min] : {std::pair(large, 60), std::pair(small, 20), std::pair(none, 0)}) {
+    kernel_->join(id, member.pid());
+    EXPECT_EQ(adjOf(member.pid()), adjFor(min)) << min;
+  }
+}
+
+TEST_F(OnLinux, AnOomScoreAdjThatAnotherProgramChoseIsKept) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 60, -1);
+  const Member member("");
+  std::ofstream("/proc/" + std::to_string(member.pid()) + "/oom_score_adj") << 7;
+  kernel_->join(id, member.pid());
+  setMemory(id, 20, -1);
+  EXPECT_EQ(adjOf(member.pid()), 7);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AGroupWithAMinimumIsMarkedForSystemdOomd) {
+  const GroupId id = create("host/opt", "pool");
+  for (const int64_t min : {20, 0}) {
+    setMemory(id, min, -1);
+    for (const char *mark : {"user.oomd_avoid", "user.oomd_omit"}) {
+      EXPECT_EQ(attribute("host/opt/pool", mark), min == 0 ? "" : "1");
+    }
+  }
 }
 
 // ---- what a process keeps open
