@@ -10,12 +10,17 @@
 #include "knob/allocation.h"
 #include "knob/linux/lowering.h"
 #include "knob/linux/oom_score.h"
+#include "knob/names.h"
 #include "knob/peaks.h"
 
 namespace Knob::Linux {
 namespace {
 
 constexpr Resource kResources[] = {Resource::kMemory, Resource::kCpu};
+
+std::string fixedChildPath() {
+  return std::string(kRootName) + "/" + std::string(kFixedChildName);
+}
 
 bool areEqual(const Allocation &left, const Allocation &right) {
   return std::tie(left.min, left.max, left.minLimit, left.shares) ==
@@ -167,16 +172,63 @@ void AllocationManager::admitInto(std::vector<Ancestor> &ancestors, Group &group
     above = tree_.parentOf(*above);
   }
 
-  const auto admitted = admit(std::move(states), wanted, capacity(resource));
-  if (!admitted) {
-    throw KernelError(Status::kReservationRefused,
-                      "no room in the group, in one above it or on the machine");
-  }
+  const bool grows = reservationOf({wanted, own.childrenSum}) > reservationOf(own);
+  const int64_t capacity = grows ? account(resource).capacity() : 0;
+  Refusal refusal{};
+  const auto admitted = admit(std::move(states), wanted, capacity, &refusal);
+  if (!admitted) refuse(refusal, resource, group, ancestors);
   for (size_t i = 1; i < admitted->size(); ++i) {
     Record &record = ancestors[i - 1].after;
     record.state(resource) = (*admitted)[i];
     raisePeaks(record);
   }
+}
+
+// Of the groups directly below the ones at the paths, the few that reserve most.
+std::vector<Holder> AllocationManager::largestReservations(Resource resource,
+                                                           const std::vector<std::string> &paths) {
+  constexpr size_t kMaxNamed = 3;
+  std::vector<Holder> holders;
+  for (const std::string &path : paths) {
+    const GroupPtr group = tree_.lookUp(path);
+    if (!group) continue;
+    for (const Child &child : readChildren(group->fd())) {
+      const std::string childPath = path + "/" + child.name;
+      const GroupPtr below = childPath == fixedChildPath() ? GroupPtr() : tree_.lookUp(childPath);
+      const int64_t reserved =
+          below ? reservationOf(readRecord(below->fd()).record.state(resource)) : 0;
+      if (reserved > 0) holders.push_back({childPath, reserved});
+    }
+  }
+  std::stable_sort(holders.begin(), holders.end(), [](const Holder &left, const Holder &right) {
+    return left.amount > right.amount;
+  });
+  if (holders.size() > kMaxNamed) holders.resize(kMaxNamed);
+  return holders;
+}
+
+// "250 MB asked for, 116 MB free on the machine: 64 MB for the system, 300 MB for host/opt/a".
+void AllocationManager::refuse(const Refusal &refusal, Resource resource, Group &group,
+                               const std::vector<Ancestor> &ancestors) {
+  const auto amount = [&](int64_t number) {
+    return std::to_string(number) + " " + unitOf(resource);
+  };
+  std::string text = amount(refusal.asked) + " asked for, " +
+                     amount(std::max<int64_t>(refusal.free, 0)) + " free ";
+  std::vector<Holder> holders;
+  std::vector<std::string> paths = {std::string(kRootName), fixedChildPath()};
+  if (refusal.at > ancestors.size()) {
+    text += "on the machine";
+    holders = account(resource).holders;
+  } else {
+    paths = {tree_.pathOf(refusal.at == 0 ? group : *ancestors[refusal.at - 1].group)};
+    text += "in " + paths.front();
+  }
+  for (Holder &each : largestReservations(resource, paths)) holders.push_back(std::move(each));
+  for (size_t i = 0; i < holders.size(); ++i) {
+    text += (i == 0 ? ": " : ", ") + amount(holders[i].amount) + " for " + holders[i].name;
+  }
+  throw KernelError(Status::kReservationRefused, text);
 }
 
 // Another program may have written the files of a group without a record.

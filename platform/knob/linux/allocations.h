@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "knob/linux/capacity.h"
 #include "knob/linux/cgroup_tree.h"
 #include "knob/linux/control_values.h"
 #include "knob/linux/record.h"
@@ -25,7 +26,9 @@ std::string textOf(const Deviation &deviation);
 
 class AllocationManager {
  public:
-  AllocationManager(CgroupTree &tree, const HostFacts &facts) : tree_(tree), facts_(facts) {}
+  // The references must outlive this object.
+  AllocationManager(CgroupTree &tree, const HostFacts &facts, const Reserve &reserve)
+      : tree_(tree), facts_(facts), capacity_(tree.hierarchy(), facts, reserve) {}
 
   // Checks the whole change, then applies the whole change. Throws KernelError: bad parameter,
   // reservation refused, memory busy, failure (a record that cannot be read).
@@ -41,7 +44,8 @@ class AllocationManager {
   // The oom_score_adj that the members of a group get.
   int oomScoreAdj(const Record &record) const;
 
-  int64_t capacity(Resource resource) const { return machineCapacity(facts_, resource); }
+  // What the machine can promise.
+  const Account &account(Resource resource) { return capacity_.account(resource); }
 
  private:
   // A group above the one that changes.
@@ -57,6 +61,9 @@ class AllocationManager {
   StoredRecord readToChange(Group &group);
   void apply(Group &group, const StoredRecord &stored, Resource resource, const Allocation &wanted);
   void protectMembers(const Group &group, const Record &before, const Record &after) const;
+  [[noreturn]] void refuse(const Refusal &refusal, Resource resource, Group &group,
+                           const std::vector<Ancestor> &ancestors);
+  std::vector<Holder> largestReservations(Resource resource, const std::vector<std::string> &paths);
   void admitInto(std::vector<Ancestor> &ancestors, Group &group, Resource resource,
                  const ResourceState &own, const Allocation &wanted);
   ControlTexts currentTexts(const Group &group, const StoredRecord &stored,
@@ -65,6 +72,7 @@ class AllocationManager {
 
   CgroupTree &tree_;
   const HostFacts &facts_;
+  Capacity capacity_;
 };
 
 }  // namespace Knob::Linux

@@ -3,7 +3,6 @@
 // was checked when it was first looked up still holds.
 #include "knob/linux/cgroup_tree.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -37,10 +36,6 @@ static_assert(sizeof(ino_t) == sizeof(GroupId), "an inode number is a group's id
 // In one write: in a group with processes "+cpu" alone would succeed and make it a threaded one.
 constexpr const char *kEnable = "+memory +cpu";
 constexpr const char *kDisable = "-memory -cpu";
-
-struct DirectoryCloser {
-  void operator()(DIR *directory) const { (void)::closedir(directory); }
-};
 
 bool hasControllers(const Group &group) {
   return hasControl(group.fd(), infoOf(Control::kMemoryMax).name) &&
@@ -198,7 +193,7 @@ GroupPtr CgroupTree::findByWalking(GroupId id) {
     paths.pop_back();
     Group group;
     if (openBeneath(hierarchy_.directory.get(), path, group.directory) != 0) continue;
-    for (const Child &child : children(group)) {
+    for (const Child &child : readChildren(group.fd())) {
       paths.push_back(path + "/" + child.name);
       if (child.id != id) continue;
       if (GroupPtr found = lookUp(paths.back()); found && found->id == id) return found;
@@ -310,21 +305,12 @@ const std::string &CgroupTree::nameOf(Group &group) {
   return group.name;
 }
 
-std::vector<Child> CgroupTree::children(const Group &group) const {
-  UniqueFd directory(::openat(group.fd(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!directory) fail(errno, "cannot read the group's directory");
-  const std::unique_ptr<DIR, DirectoryCloser> stream(::fdopendir(directory.get()));
-  if (!stream) fail(errno, "cannot read the group's directory");
-  (void)directory.release();  // the stream closes it
-
-  std::vector<Child> children;
-  for (errno = 0; const dirent *entry = ::readdir(stream.get()); errno = 0) {
-    const std::string_view name = entry->d_name;
-    if (entry->d_type != DT_DIR || name == "." || name == "..") continue;
-    children.push_back({static_cast<GroupId>(entry->d_ino), std::string(name)});
+std::string CgroupTree::pathOf(Group &group) {
+  std::string path = nameOf(group);
+  for (GroupPtr above = parentOf(group); above; above = parentOf(*above)) {
+    path = nameOf(*above) + "/" + path;
   }
-  if (errno != 0) fail(errno, "cannot read the group's directory");
-  return children;
+  return path;
 }
 
 bool CgroupTree::hasChildren(const Group &group) const {

@@ -32,11 +32,6 @@ struct Group {
 };
 using GroupPtr = std::shared_ptr<Group>;
 
-struct Child {
-  GroupId id;
-  std::string name;
-};
-
 class CgroupTree {
  public:
   explicit CgroupTree(Hierarchy hierarchy);
@@ -68,11 +63,10 @@ class CgroupTree {
   // Throws KernelError (busy, not found).
   void remove(Group &group, Group &parent);
 
-  // The group's name in its parent's directory.
+  // The group's name in its parent's directory, and its path from host on.
   const std::string &nameOf(Group &group);
+  std::string pathOf(Group &group);
 
-  // The child groups. One that is deleted meanwhile hides no other.
-  std::vector<Child> children(const Group &group) const;
   bool hasChildren(const Group &group) const;
 
   void requireAlive(const Group &group) const;

@@ -58,7 +58,7 @@ class Checker {
     entries_.push_back({tree_.host()->id, std::string(kRootName), 0});
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
-        for (const Child &child : tree_.children(*tree_.find(entries_[i].id))) {
+        for (const Child &child : readChildren(tree_.find(entries_[i].id)->fd())) {
           entries_.push_back({child.id, entries_[i].path + "/" + child.name, i});
         }
       });
@@ -184,19 +184,21 @@ class Checker {
   }
 
   void checkMachine(int64_t memory, int64_t cpu) {
-    checkCapacity(Resource::kMemory, memory, " MB");
-    checkCapacity(Resource::kCpu, cpu, " percent of CPU");
+    checkCapacity(Resource::kMemory, memory);
+    checkCapacity(Resource::kCpu, cpu);
     for (std::string &text : unprotectedAbove(tree_.hierarchy(), memory)) {
       report(std::string(kRootName), text, false);
     }
   }
 
-  void checkCapacity(Resource resource, int64_t reserved, const std::string &unit) {
-    const int64_t capacity = allocations_.capacity(resource);
-    if (reserved <= capacity) return;
+  void checkCapacity(Resource resource, int64_t reserved) {
+    const Account &account = allocations_.account(resource);
+    if (reserved <= account.capacity()) return;
     report(std::string(kRootName),
-           "the groups reserve " + std::to_string(reserved) + unit + ", the machine has " +
-               std::to_string(capacity),
+           "more is promised than the machine can give: the groups reserve " +
+               std::to_string(reserved) + " " + unitOf(resource) + ", it has " +
+               std::to_string(account.capacity()) + " for them of " +
+               std::to_string(account.total) + " (" + textOf(account) + ")",
            false);
   }
 

@@ -47,8 +47,10 @@ GroupUsage usageOf(const Group &group) {
 
 class LinuxKernel final : public Kernel {
  public:
-  LinuxKernel(Hierarchy hierarchy, uint32_t maxVms)
-      : tree_(std::move(hierarchy)), facts_(factsWith(maxVms)), allocations_(tree_, facts_) {}
+  LinuxKernel(Hierarchy hierarchy, const Configuration &configuration)
+      : tree_(std::move(hierarchy)),
+        facts_(factsWith(configuration.maxVms)),
+        allocations_(tree_, facts_, configuration.reserve) {}
 
   GroupId lookUp(std::string_view path) override {
     const auto components = splitPath(path);
@@ -100,7 +102,7 @@ class LinuxKernel final : public Kernel {
 
   std::vector<GroupId> childGroups(GroupId id) override {
     std::vector<GroupId> ids;
-    for (const Child &child : tree_.children(*find(id))) ids.push_back(child.id);
+    for (const Child &child : readChildren(find(id)->fd())) ids.push_back(child.id);
     return ids;
   }
 
@@ -229,6 +231,14 @@ bool mayMakeGroupsIn(int directory) {
   return true;
 }
 
+std::string accountLine(const Account &account, int64_t reserved) {
+  const auto amount = [&](int64_t number) {
+    return std::to_string(number) + " " + unitOf(account.resource);
+  };
+  return amount(account.total) + ": " + textOf(account) + "; " + amount(account.capacity()) +
+         " for groups, which reserve " + amount(reserved);
+}
+
 LinuxHost lookAt(const Configuration &configuration) {
   CgroupTree tree(openHierarchy(configuration));
   LinuxHost result;
@@ -240,8 +250,15 @@ LinuxHost lookAt(const Configuration &configuration) {
     result.problems.push_back("no right to make or change groups in " + result.path +
                               kHowToGetRights);
   }
+  const Record record = host ? readRecord(host->fd()).record : Record();
+  const int64_t promisedMB = reservationOf(record.memory);
+  const HostFacts facts = factsWith(configuration.maxVms);
+  for (const auto &[name, resource] :
+       {std::pair("memory", Resource::kMemory), std::pair("CPU", Resource::kCpu)}) {
+    const Account account = readAccount(resource, tree.hierarchy(), facts, configuration.reserve);
+    result.account.emplace_back(name, accountLine(account, reservationOf(record.state(resource))));
+  }
   if (!host) return result;
-  const int64_t promisedMB = reservationOf(readRecord(host->fd()).record.memory);
   for (std::string &text : unprotectedAbove(tree.hierarchy(), promisedMB)) {
     result.problems.push_back(std::move(text));
   }
@@ -253,8 +270,7 @@ LinuxHost lookAt(const Configuration &configuration) {
 
 std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration) {
   return Linux::beforeUse([&] {
-    return std::make_unique<Linux::LinuxKernel>(Linux::openHierarchy(configuration),
-                                                configuration.maxVms);
+    return std::make_unique<Linux::LinuxKernel>(Linux::openHierarchy(configuration), configuration);
   });
 }
 

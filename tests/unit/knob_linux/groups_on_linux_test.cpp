@@ -590,6 +590,61 @@ TEST_F(OnLinux, ReadingTheSignatureMakesNoGroup) {
   EXPECT_FALSE(std::filesystem::exists(kMount / "host"));
 }
 
+// ---- what the machine can promise
+
+TEST_F(OnLinux, WhatAnotherSliceProtectsIsNotPromisedAgain) {
+  configuration_.reserve = {20, 0};
+  kernel_ = open();
+  const GroupId id = create("host/opt", "pool");
+  ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+  write("theirs", "memory.min", "104857600");
+  std::string text;
+  EXPECT_EQ(statusOfCall([&] { setMemory(id, 150, -1); }, &text), Status::kReservationRefused);
+  EXPECT_THAT(text, testing::MatchesRegex("150 MB asked for, [0-9]+ MB free on the machine: 20 MB "
+                                          "for the system, 100 MB for /sys/fs/cgroup/theirs"));
+  EXPECT_EQ(fileText("host", "memory.min"), "0");
+}
+
+TEST_F(OnLinux, WhatAnotherSliceProtectsLaterIsReportedAsOverPromised) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 100, -1);
+  ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+  write("theirs", "memory.min", "104857600");
+  const auto lines = [&] {
+    kernel_ = open();
+    return check(true);
+  }();
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_THAT(lines[0], HasSubstr("more is promised than the machine can give"));
+  EXPECT_THAT(lines[0], HasSubstr("100 MB for /sys/fs/cgroup/theirs"));
+  setMemory(id, 0, -1);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ARefusalNamesTheGroupWithoutRoomAndItsHolders) {
+  const GroupId parent = create("host/opt", "parent");
+  setMemory(parent, 0, 50);
+  setMemory(create("host/opt/parent", "a"), 30, -1);
+  std::string text;
+  const GroupId b = create("host/opt/parent", "b");
+  EXPECT_EQ(statusOfCall([&] { setMemory(b, 25, -1); }, &text), Status::kReservationRefused);
+  EXPECT_EQ(text, "25 MB asked for, 20 MB free in host/opt/parent: 30 MB for host/opt/parent/a");
+}
+
+TEST_F(OnLinux, TheStatusHasTheWholeAccount) {
+  configuration_.reserve = {20, 10};
+  kernel_ = open();
+  setMemory(create("host/opt", "pool"), 30, -1);
+  const LinuxHost host = lookAtLinuxHost(configuration_);
+  ASSERT_EQ(host.account.size(), 2U);
+  EXPECT_THAT(host.account[0].second,
+              testing::MatchesRegex("[0-9]+ MB: 20 MB for the system; [0-9]+ MB for groups, which "
+                                    "reserve 30 MB"));
+  EXPECT_EQ(host.account[1].second,
+            "100 % of a CPU: 10 % of a CPU for the system; 90 % of a CPU "
+            "for groups, which reserve 0 % of a CPU");
+}
+
 // ---- the machine out of memory
 
 int adjOf(pid_t pid) {
