@@ -3,7 +3,11 @@
 // up: a process that is killed in between leaves too much reserved, never too little.
 #include "knob/linux/allocations.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <cerrno>
 #include <tuple>
 
 #include "knob/admission.h"
@@ -25,6 +29,18 @@ std::string fixedChildPath() {
 bool areEqual(const Allocation &left, const Allocation &right) {
   return std::tie(left.min, left.max, left.minLimit, left.shares) ==
          std::tie(right.min, right.max, right.minLimit, right.shares);
+}
+
+// Whether only root, or the user of this process, can have written the group's record.
+bool isOurs(const Group &group) {
+  struct stat status {};
+  if (::fstat(group.fd(), &status) != 0) fail(errno, "cannot examine the group's directory");
+  return status.st_uid == 0 || status.st_uid == ::geteuid();
+}
+
+int64_t minimumIn(const Group &group) {
+  const auto text = readControlIfAny(group.fd(), infoOf(Control::kMemoryMin).name);
+  return text ? minimumMegabytes(parseLimit(*text).value_or(0)) : 0;
 }
 
 void raisePeaks(Record &record) {
@@ -60,7 +76,7 @@ void AllocationManager::change(Group &group, Resource resource, const Allocation
 }
 
 void AllocationManager::remove(Group &group, Group &parent) {
-  const StoredRecord stored = readRecord(group.fd());
+  const StoredRecord stored = read(group);
   std::vector<Ancestor> ancestors;
   for (Resource resource : kResources) {
     ResourceState own;
@@ -85,9 +101,39 @@ std::vector<Deviation> AllocationManager::deviations(const Group &group,
   return found;
 }
 
+StoredRecord AllocationManager::read(Group &group) {
+  StoredRecord stored = readRecord(group.fd());
+  const GroupPtr parent = stored.isStored && !isOurs(group) ? tree_.parentOf(group) : GroupPtr();
+  if (!parent) return stored;
+  for (Resource resource : kResources) {
+    ResourceState &state = stored.record.state(resource);
+    const int64_t counted = countedFor(group, *parent, resource);
+    state.allocation.min = std::min(state.allocation.min, counted);
+    state.childrenSum = std::min(state.childrenSum, counted);
+  }
+  return stored;
+}
+
+// What is left of the parent's sum without the other children. Of another delegated one only the
+// file counts that libknob wrote.
+int64_t AllocationManager::countedFor(const Group &group, Group &parent, Resource resource) {
+  int64_t counted = read(parent).record.state(resource).childrenSum;
+  for (const Child &child : readChildren(parent.fd())) {
+    if (child.id == group.id) continue;
+    const GroupPtr sibling = tree_.find(child.id);
+    const StoredRecord stored = readRecord(sibling->fd());
+    if (isOurs(*sibling)) {
+      counted = changedSum(counted, reservationOf(countedState(stored, resource)), 0);
+    } else if (resource == Resource::kMemory) {
+      counted = changedSum(counted, minimumIn(*sibling), 0);
+    }
+  }
+  return counted;
+}
+
 // A record that cannot be read may be that of a newer library, so it is not overwritten.
 StoredRecord AllocationManager::readToChange(Group &group) {
-  StoredRecord stored = readRecord(group.fd());
+  StoredRecord stored = read(group);
   if (stored.isDamaged) {
     throw KernelError(Status::kFailure, "the record of " + tree_.nameOf(group) +
                                             " is damaged or of another version; see knobctl check");

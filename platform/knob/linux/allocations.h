@@ -30,6 +30,11 @@ class AllocationManager {
   AllocationManager(CgroupTree &tree, const HostFacts &facts, const Reserve &reserve)
       : tree_(tree), facts_(facts), capacity_(tree.hierarchy(), facts, reserve) {}
 
+  // The record of a group. A directory that belongs to another user is delegated, and its owner can
+  // write the record: then no more is reserved than the group above counts for it. Throws
+  // KernelError.
+  StoredRecord read(Group &group);
+
   // Checks the whole change, then applies the whole change. Throws KernelError: bad parameter,
   // reservation refused, memory busy, failure (a record that cannot be read).
   void change(Group &group, Resource resource, const AllocationChange &change);
@@ -59,6 +64,7 @@ class AllocationManager {
   // counts. Returns whether it did; the caller must then read the record again.
   bool countForeignMinimum(Group &group, const StoredRecord &stored);
   StoredRecord readToChange(Group &group);
+  int64_t countedFor(const Group &group, Group &parent, Resource resource);
   void apply(Group &group, const StoredRecord &stored, Resource resource, const Allocation &wanted);
   void protectMembers(const Group &group, const Record &before, const Record &after) const;
   [[noreturn]] void refuse(const Refusal &refusal, Resource resource, Group &group,

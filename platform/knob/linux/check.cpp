@@ -19,6 +19,7 @@ struct Entry {
   GroupId id;
   std::string path;
   size_t parent;  // index in the list; that of the first is its own
+  bool hasChildren = false;
   int64_t memorySum = 0, cpuSum = 0;
 };
 
@@ -59,6 +60,7 @@ class Checker {
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
         for (const Child &child : readChildren(tree_.find(entries_[i].id)->fd())) {
+          entries_[i].hasChildren = true;
           entries_.push_back({child.id, entries_[i].path + "/" + child.name, i});
         }
       });
@@ -69,7 +71,7 @@ class Checker {
     whileThere([&] {
       const GroupPtr group = tree_.find(entry.id);
       tree_.requireAlive(*group);
-      StoredRecord stored = readRecord(group->fd());
+      StoredRecord stored = allocations_.read(*group);
       if (stored.isDamaged) repairRecord(entry, *group, stored);
       if (stored.isStored) checkRecord(entry, *group, stored.record);
       if (!stored.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
@@ -78,6 +80,7 @@ class Checker {
       if (!stored.isStored) return;
       checkFiles(entry, *group, stored.record);
       checkMembers(entry, *group, stored.record);
+      checkProtection(entry, stored.record);
       addToParent(entry, stored.record);
     });
   }
@@ -165,6 +168,16 @@ class Checker {
       if (error.status == Status::kNotFound) throw;
       return std::string(": ") + error.what();
     }
+  }
+
+  void checkProtection(const Entry &entry, const Record &record) {
+    const int64_t surplus = record.memory.allocation.min - entry.memorySum;
+    if (tree_.hierarchy().protectsRecursively || !entry.hasChildren || surplus <= 0) return;
+    report(entry.path,
+           std::to_string(surplus) +
+               " MB of its memory minimum protect nothing, since its child groups do not reserve "
+               "them: cgroup2 is mounted without memory_recursiveprot",
+           false);
   }
 
   // Processes that another program moved in.

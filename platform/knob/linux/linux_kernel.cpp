@@ -258,6 +258,11 @@ LinuxHost lookAt(const Configuration &configuration) {
     const Account account = readAccount(resource, tree.hierarchy(), facts, configuration.reserve);
     result.account.emplace_back(name, accountLine(account, reservationOf(record.state(resource))));
   }
+  if (!tree.hierarchy().protectsRecursively) {
+    result.account.emplace_back("protection",
+                                "a minimum protects no child groups beyond what they reserve: "
+                                "cgroup2 is mounted without memory_recursiveprot");
+  }
   if (!host) return result;
   for (std::string &text : unprotectedAbove(tree.hierarchy(), promisedMB)) {
     result.problems.push_back(std::move(text));

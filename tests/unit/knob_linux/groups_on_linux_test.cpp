@@ -645,6 +645,82 @@ TEST_F(OnLinux, TheStatusHasTheWholeAccount) {
             "for groups, which reserve 0 % of a CPU");
 }
 
+// ---- a delegated directory
+
+class Delegated : public OnLinux {
+ protected:
+  static constexpr uid_t kUser = 12345;
+
+  void SetUp() override {
+    OnLinux::SetUp();
+    other_ = create("host/opt", "other");
+    setMemory(other_, 30, -1);
+    setCpuMin(other_, 20);
+    theirs_ = create("host/opt", "theirs");
+    setMemory(theirs_, 10, -1);
+    setCpuMin(theirs_, 5);
+    ASSERT_EQ(::chown((kMount / "host/opt/theirs").c_str(), kUser, kUser), 0);
+  }
+
+  // As the owner of the directory.
+  void writeRecordOf(int64_t memoryMin, int64_t cpuMin, int64_t childrenSum) {
+    elsewhere([&] {
+      ASSERT_EQ(::setuid(kUser), 0);
+      Record record = *decode(attribute("host/opt/theirs", kRecordAttribute));
+      record.memory = {{memoryMin, -1, -1, -3}, childrenSum};
+      record.cpu = {{cpuMin, -1, -1, -3}, childrenSum};
+      const RecordBytes bytes = encode(record);
+      setAttribute("host/opt/theirs", kRecordAttribute, {bytes.data(), bytes.size()});
+    });
+  }
+
+  // Only the other group is left, with all that it reserved.
+  void expectOnlyTheOther() {
+    EXPECT_EQ(fileText("host", "memory.min"), "31457280");
+    const Record opt = *decode(attribute("host/opt", kRecordAttribute));
+    EXPECT_EQ(opt.memory.childrenSum, 30);
+    EXPECT_EQ(opt.cpu.childrenSum, 20);
+    EXPECT_TRUE(check(false).empty());
+  }
+
+  GroupId other_ = 0, theirs_ = 0;
+};
+
+TEST_F(Delegated, ARecordThatClaimsMoreReleasesOnlyWhatWasCounted) {
+  for (const int64_t claimed : {11, 35, 1000000}) {
+    SCOPED_TRACE(claimed);
+    writeRecordOf(claimed, claimed, 0);
+    kernel_->remove(theirs_);
+    expectOnlyTheOther();
+    theirs_ = create("host/opt", "theirs");
+    setMemory(theirs_, 10, -1);
+    setCpuMin(theirs_, 5);
+    ASSERT_EQ(::chown((kMount / "host/opt/theirs").c_str(), kUser, kUser), 0);
+  }
+}
+
+TEST_F(Delegated, ASumThatTheOwnerWroteReleasesOnlyWhatWasCounted) {
+  writeRecordOf(10, 5, 1000000);
+  kernel_->remove(theirs_);
+  expectOnlyTheOther();
+}
+
+TEST_F(Delegated, ARecordThatClaimsMoreIsNotBelievedByRepair) {
+  writeRecordOf(1000, 1000, 0);
+  (void)check(true);
+  EXPECT_EQ(fileText("host", "memory.min"), "41943040");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(Delegated, AChangeOfItsMinimumTakesNothingFromTheOthers) {
+  writeRecordOf(1000000, 1000000, 0);
+  setMemory(theirs_, 4, -1);
+  setCpuMin(theirs_, 4);
+  EXPECT_EQ(fileText("host", "memory.min"), "35651584");
+  kernel_->remove(theirs_);
+  expectOnlyTheOther();
+}
+
 // ---- the machine out of memory
 
 int adjOf(pid_t pid) {
