@@ -18,12 +18,14 @@
 #include <system_error>
 #include <thread>
 
+#include "common/unique_fd.h"
 #include "kestrel/etcd/http_client.h"
 #include "process.h"
 #include "temp_folder.h"
-#include "unique_fd.h"
 
 namespace Test {
+
+using Platform::UniqueFd;
 
 namespace fs = std::filesystem;
 

@@ -48,13 +48,13 @@ bool isIn(const std::array<Range, N> &ranges, uint32_t point) {
 
 struct Character {
   uint32_t point = 0;
-  size_t length = 0;  // 0: the bytes are no UTF-8
+  size_t length = 0;  // 0: the bytes are not UTF-8
 };
 
 bool isWellFormed(uint32_t point, size_t length) {
-  constexpr std::array<uint32_t, 5> kLeast = {0, 0, 0x80, 0x800, 0x10000};
+  constexpr std::array<uint32_t, 5> kMin = {0, 0, 0x80, 0x800, 0x10000};
   const bool surrogate = point >= 0xD800 && point <= 0xDFFF;
-  return point >= kLeast[length] && point <= 0x10FFFF && !surrogate;
+  return point >= kMin[length] && point <= 0x10FFFF && !surrogate;
 }
 
 Character characterAt(std::string_view text, size_t at) {
