@@ -636,13 +636,28 @@ TEST_F(OnLinux, TheStatusHasTheWholeAccount) {
   kernel_ = open();
   setMemory(create("host/opt", "pool"), 30, -1);
   const LinuxHost host = lookAtLinuxHost(configuration_);
-  ASSERT_EQ(host.account.size(), 2U);
+  ASSERT_EQ(host.account.size(), 3U);
   EXPECT_THAT(host.account[0].second,
               testing::MatchesRegex("[0-9]+ MB: 20 MB for the system; [0-9]+ MB for groups, which "
                                     "reserve 30 MB"));
   EXPECT_EQ(host.account[1].second,
             "100 % of a CPU: 10 % of a CPU for the system; 90 % of a CPU "
             "for groups, which reserve 0 % of a CPU");
+}
+
+// The machine's own mount has no memory_recursiveprot.
+TEST_F(OnLinux, AMinimumThatDoesNotProtectTheChildrenIsReported) {
+  const GroupId parent = create("host/opt", "parent");
+  setMemory(parent, 100, -1);
+  EXPECT_TRUE(check(false).empty()) << "without children it protects the group itself";
+  const GroupId child = create("host/opt/parent", "child");
+  setMemory(child, 40, -1);
+  const auto lines = check(false);
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_THAT(lines[0], HasSubstr("host/opt/parent: 60 MB of its memory minimum protect nothing"));
+  EXPECT_EQ(lookAtLinuxHost(configuration_).account[2].first, "protection");
+  setMemory(child, 100, -1);
+  EXPECT_TRUE(check(false).empty());
 }
 
 // ---- a delegated directory
