@@ -54,7 +54,7 @@ install(DIRECTORY ${CMAKE_SOURCE_DIR}/examples
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl COMPONENT programs)
 install(FILES ${CMAKE_SOURCE_DIR}/README.md ${CMAKE_SOURCE_DIR}/CHANGELOG.md
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl COMPONENT programs)
-install(FILES ${CMAKE_SOURCE_DIR}/docs/fleet.md
+install(FILES ${CMAKE_SOURCE_DIR}/docs/fleet.md ${CMAKE_SOURCE_DIR}/docs/poolctl-plan.schema.json
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl/docs COMPONENT programs)
 
 # Only a package installs files in /etc, since a package manager keeps the owner's changes there.

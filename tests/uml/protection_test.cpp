@@ -94,12 +94,14 @@ TEST_F(Protection, AMinimumProtectsChildPoolsOnlyWithRecursiveProtection) {
   EXPECT_EQ(remount(""), 0);
 }
 
-// What Linux itself makes of some settings. The page cache of a deleted pool stays, as its parent's
-// own. Where all that the parent may have is promised to the pools below it, the parent's maximum
-// is reached while everything below is protected, and the kernel kills.
+// What Linux itself makes of some settings. A parent has memory of its own: the page cache of a
+// deleted pool, and what the kernel needs for the groups below it, which is more on more CPUs.
+// Where the pools below may have all that the parent may have, the parent's maximum is reached
+// first; where all of that is protected, the kernel cannot reclaim anything, and kills.
 class TightParent : public Protection {
  protected:
-  // Reads 120 MB in outer/inner, makes that pool anew, and reads as much there again.
+  // Reads 120 MB in outer/inner, makes that pool anew, and reads as much there again. The second
+  // reader is given to "expect".
   void readTwice(const std::string &outer, const std::string &inner,
                  const std::function<void(Worker &)> &expect) {
     ASSERT_TRUE(silentlyDone(world.poolctl({"load", world.file("outer.yaml", outer)})));
@@ -107,7 +109,7 @@ class TightParent : public Protection {
     ASSERT_TRUE(silentlyDone(world.poolctl({"load", file})));
     {
       Worker before("host/opt/outer/inner", readThrough(fileOfMB("before", 120)));
-      ASSERT_TRUE(before.waitUntilDone());
+      before.waitUntilDone();
     }
     ASSERT_TRUE(silentlyDone(world.poolctl({"unload", file})));
     ASSERT_TRUE(silentlyDone(world.poolctl({"load", file})));
@@ -119,11 +121,12 @@ class TightParent : public Protection {
     readTwice(outer, inner, [](Worker &reader) {
       EXPECT_TRUE(reader.waitUntilDone());
       EXPECT_TRUE(reader.alive());
-      EXPECT_EQ(oomKills(), 0);
+      EXPECT_EQ(numberIn("host/opt/outer", "memory.events", "oom_kill"), 0);
     });
   }
 };
 
+// User-mode Linux 6.1 kills the second reader alone, machines with several CPUs the first one too.
 TEST_F(TightParent, AMinimumAsLargeAsTheMaximumUnderAParentOfThatSizeGetsAReaderKilled) {
   readTwice("- name: outer\n  mem: 80\n", "- name: outer/inner\n  mem: 80\n", [](Worker &reader) {
     EXPECT_FALSE(reader.waitUntilDone());

@@ -313,6 +313,14 @@ std::string CgroupTree::pathOf(Group &group) {
   return path;
 }
 
+std::vector<Child> CgroupTree::besideHost() const {
+  std::vector<Child> groups = readChildren(hierarchy_.directory.get());
+  groups.erase(std::remove_if(groups.begin(), groups.end(),
+                              [](const Child &group) { return group.name == kRootName; }),
+               groups.end());
+  return groups;
+}
+
 bool CgroupTree::hasChildren(const Group &group) const {
   struct stat status {};
   if (::fstat(group.fd(), &status) != 0) fail(errno, "cannot examine the group's directory");

@@ -69,6 +69,9 @@ class CgroupTree {
 
   bool hasChildren(const Group &group) const;
 
+  // The groups of other programs beside host. Throws KernelError.
+  std::vector<Child> besideHost() const;
+
   void requireAlive(const Group &group) const;
 
   // Whether living processes are in the group or below it.
