@@ -25,6 +25,10 @@ void raisePeaks(Record &record) {
   record.peaks = raisedPeaks(record.peaks, record.memory.allocation.min, record.memory.childrenSum);
 }
 
+int64_t weightIn(const StoredRecord &stored) {
+  return weightOfShares(stored.record.cpu.allocation.shares);
+}
+
 // What the sums above count of a group: without a record nothing yet.
 ResourceState countedState(const StoredRecord &stored, Resource resource) {
   ResourceState state = stored.record.state(resource);
@@ -38,6 +42,13 @@ std::string textOf(const Deviation &deviation) {
   const std::string name = infoOf(deviation.expected.control).name;
   if (!deviation.actual) return "there is no " + name + ": its controller is not enabled";
   return name + " is " + *deviation.actual + ", not " + deviation.expected.text;
+}
+
+void AllocationManager::add(const GroupPtr &group, Group &parent) {
+  writeRecord(group->fd(), Record());
+  UndoableWrites writes(tree_);
+  cpu_.update(writes, group, {parent.id, 1, weightIn({})});
+  writes.commit();
 }
 
 void AllocationManager::change(Group &group, Resource resource, const AllocationChange &change) {
@@ -65,13 +76,27 @@ void AllocationManager::remove(Group &group, Group &parent) {
   UndoableWrites writes(tree_);
   for (const Ancestor &ancestor : ancestors) writeAncestor(writes, ancestor);
   writes.commit();
+  updateCpuWithout(parent, stored);
 }
 
-std::vector<Deviation> AllocationManager::deviations(const Group &group,
-                                                     const Record &record) const {
+// The group is gone, so what fails here is left to `knobctl check`.
+void AllocationManager::updateCpuWithout(Group &parent, const StoredRecord &removed) const {
+  try {
+    UndoableWrites writes(tree_);
+    cpu_.update(writes, tree_.find(parent.id), {parent.id, -1, -weightIn(removed)});
+    writes.commit();
+  } catch (const KernelError &) {
+    // The weights of the remaining groups keep at least what they kept before.
+  }
+}
+
+std::vector<Deviation> AllocationManager::deviations(const Group &group, const Record &record,
+                                                     int64_t weight) const {
   std::vector<Deviation> found;
   for (Resource resource : kResources) {
-    for (ControlText &expected : controlTextsFor(resource, record.state(resource), facts_.cpus)) {
+    ControlTexts texts = controlTextsFor(resource, record.state(resource));
+    if (resource == Resource::kCpu) texts.push_back({Control::kCpuWeight, std::to_string(weight)});
+    for (ControlText &expected : texts) {
       auto actual = readControlIfAny(group.fd(), infoOf(expected.control).name);
       if (actual != expected.text) found.push_back({std::move(expected), std::move(actual)});
     }
@@ -105,11 +130,12 @@ void AllocationManager::apply(Group &group, const StoredRecord &stored, Resource
   const bool grows = reservationOf(after.state(resource)) > reservationOf(counted);
   std::vector<Ancestor> ancestors;
   admitInto(ancestors, group, resource, counted, wanted);
+  if (grows && resource == Resource::kCpu) requireCpuKept(ancestors, group, after.cpu);
   if (grows) std::reverse(ancestors.begin(), ancestors.end());
 
   UndoableWrites writes(tree_);
   ControlTexts from = currentTexts(group, stored, resource);
-  const ControlTexts to = controlTextsFor(resource, after.state(resource), facts_.cpus);
+  const ControlTexts to = controlTextsFor(resource, after.state(resource));
   if (resource == Resource::kMemory && isLowerLimit(from[1].text, to[1].text)) {
     lowerMemoryMax(tree_, group, stored, from[1].text, to[1].text, writes);
     from[1] = to[1];
@@ -124,7 +150,27 @@ void AllocationManager::apply(Group &group, const StoredRecord &stored, Resource
   if (!grows) {
     for (const Ancestor &ancestor : ancestors) writeAncestor(writes, ancestor);
   }
+  updateCpu(writes, group, stored, after);
   writes.commit();
+}
+
+// Only a reservation of host itself competes with groups of other programs.
+void AllocationManager::requireCpuKept(const std::vector<Ancestor> &ancestors, Group &group,
+                                       const ResourceState &own) const {
+  Group &top = ancestors.empty() ? group : *ancestors.back().group;
+  if (tree_.parentOf(top)) return;
+  cpu_.requireKept(ancestors.empty() ? own : ancestors.back().after.cpu);
+}
+
+void AllocationManager::updateCpu(UndoableWrites &writes, Group &group, const StoredRecord &before,
+                                  const Record &after) const {
+  const int64_t shareWeight = weightOfShares(after.cpu.allocation.shares) - weightIn(before);
+  const bool isSame = shareWeight == 0 && before.isStored &&
+                      reservationOf(after.cpu) == reservationOf(before.record.cpu);
+  if (isSame) return;
+  const GroupPtr parent = tree_.parentOf(group);
+  cpu_.update(writes, tree_.find(group.id),
+              {parent ? parent->id : 0, 0, shareWeight, before.isStored});
 }
 
 // Reads the ancestors of a group as far as their sums change, the parent first, and puts the sums
@@ -165,7 +211,7 @@ void AllocationManager::admitInto(std::vector<Ancestor> &ancestors, Group &group
 // Another program may have written the files of a group without a record.
 ControlTexts AllocationManager::currentTexts(const Group &group, const StoredRecord &stored,
                                              Resource resource) const {
-  ControlTexts texts = controlTextsFor(resource, stored.record.state(resource), facts_.cpus);
+  ControlTexts texts = controlTextsFor(resource, stored.record.state(resource));
   if (stored.isStored) return texts;
   for (auto &[control, text] : texts) {
     text = readControlIfAny(group.fd(), infoOf(control).name).value_or(infoOf(control).initialText);
@@ -173,16 +219,12 @@ ControlTexts AllocationManager::currentTexts(const Group &group, const StoredRec
   return texts;
 }
 
-// Of an ancestor only the reservation changes, and with it the first file of the resource.
+// Of an ancestor only the reservations change, and with that of memory memory.min.
 void AllocationManager::writeAncestor(UndoableWrites &writes, const Ancestor &ancestor) const {
   const auto &[group, before, after] = ancestor;
   writes.write(*group, before, after);
-  for (Resource resource : kResources) {
-    const ControlText from =
-        controlTextsFor(resource, before.record.state(resource), facts_.cpus)[0];
-    const ControlText to = controlTextsFor(resource, after.state(resource), facts_.cpus)[0];
-    writes.write(*group, to.control, from.text, to.text);
-  }
+  writes.write(*group, Control::kMemoryMin, memoryText(reservationOf(before.record.memory)),
+               memoryText(reservationOf(after.memory)));
 }
 
 }  // namespace Knob::Linux

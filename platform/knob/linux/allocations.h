@@ -9,6 +9,7 @@
 
 #include "knob/linux/cgroup_tree.h"
 #include "knob/linux/control_values.h"
+#include "knob/linux/cpu_distribution.h"
 #include "knob/linux/record.h"
 #include "knob/linux/undoable_writes.h"
 
@@ -25,7 +26,11 @@ std::string textOf(const Deviation &deviation);
 
 class AllocationManager {
  public:
-  AllocationManager(CgroupTree &tree, const HostFacts &facts) : tree_(tree), facts_(facts) {}
+  AllocationManager(CgroupTree &tree, const HostFacts &facts)
+      : tree_(tree), facts_(facts), cpu_(tree, facts) {}
+
+  // Gives a new group its record. Throws KernelError; the caller then removes the group.
+  void add(const GroupPtr &group, Group &parent);
 
   // Checks the whole change, then applies the whole change. Throws KernelError: bad parameter,
   // reservation refused, memory busy, failure (a record that cannot be read).
@@ -35,8 +40,11 @@ class AllocationManager {
   // busy, failure; nothing has changed.
   void remove(Group &group, Group &parent);
 
-  // The control files that differ from the record. Needs no more than the shared lock.
-  std::vector<Deviation> deviations(const Group &group, const Record &record) const;
+  // The control files that differ from the record, and cpu.weight where it is not weight. Needs no
+  // more than the shared lock.
+  std::vector<Deviation> deviations(const Group &group, const Record &record, int64_t weight) const;
+
+  const CpuDistribution &cpu() const { return cpu_; }
 
   int64_t capacity(Resource resource) const { return machineCapacity(facts_, resource); }
 
@@ -57,10 +65,16 @@ class AllocationManager {
                  const ResourceState &own, const Allocation &wanted);
   ControlTexts currentTexts(const Group &group, const StoredRecord &stored,
                             Resource resource) const;
+  void requireCpuKept(const std::vector<Ancestor> &ancestors, Group &group,
+                      const ResourceState &own) const;
+  void updateCpu(UndoableWrites &writes, Group &group, const StoredRecord &before,
+                 const Record &after) const;
+  void updateCpuWithout(Group &parent, const StoredRecord &removed) const;
   void writeAncestor(UndoableWrites &writes, const Ancestor &ancestor) const;
 
   CgroupTree &tree_;
   const HostFacts &facts_;
+  CpuDistribution cpu_;
 };
 
 }  // namespace Knob::Linux

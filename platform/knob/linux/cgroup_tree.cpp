@@ -68,6 +68,23 @@ int openGroup(int directory, std::string_view name, UniqueFd &opened, Identity &
   return error != 0 ? error : identify(opened.get(), "", identity);
 }
 
+std::vector<Child> listGroups(int group) {
+  UniqueFd directory(::openat(group, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!directory) fail(errno, "cannot read the group's directory");
+  const std::unique_ptr<DIR, DirectoryCloser> stream(::fdopendir(directory.get()));
+  if (!stream) fail(errno, "cannot read the group's directory");
+  (void)directory.release();  // the stream closes it
+
+  std::vector<Child> children;
+  for (errno = 0; const dirent *entry = ::readdir(stream.get()); errno = 0) {
+    const std::string_view name = entry->d_name;
+    if (entry->d_type != DT_DIR || name == "." || name == "..") continue;
+    children.push_back({static_cast<GroupId>(entry->d_ino), std::string(name)});
+  }
+  if (errno != 0) fail(errno, "cannot read the group's directory");
+  return children;
+}
+
 }  // namespace
 
 CgroupTree::CgroupTree(Hierarchy hierarchy) : hierarchy_(std::move(hierarchy)) {
@@ -306,22 +323,16 @@ const std::string &CgroupTree::nameOf(Group &group) {
 }
 
 std::vector<Child> CgroupTree::children(const Group &group) const {
-  UniqueFd directory(::openat(group.fd(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!directory) fail(errno, "cannot read the group's directory");
-  const std::unique_ptr<DIR, DirectoryCloser> stream(::fdopendir(directory.get()));
-  if (!stream) fail(errno, "cannot read the group's directory");
-  (void)directory.release();  // the stream closes it
-
-  std::vector<Child> children;
-  for (errno = 0; const dirent *entry = ::readdir(stream.get()); errno = 0) {
-    const std::string_view name = entry->d_name;
-    if (entry->d_type != DT_DIR || name == "." || name == "..") continue;
-    children.push_back({static_cast<GroupId>(entry->d_ino), std::string(name)});
-  }
-  if (errno != 0) fail(errno, "cannot read the group's directory");
-  return children;
+  return listGroups(group.fd());
 }
 
+std::vector<Child> CgroupTree::besideHost() const {
+  std::vector<Child> groups = listGroups(hierarchy_.directory.get());
+  groups.erase(std::remove_if(groups.begin(), groups.end(),
+                              [](const Child &group) { return group.name == kRootName; }),
+               groups.end());
+  return groups;
+}
 bool CgroupTree::hasChildren(const Group &group) const {
   struct stat status {};
   if (::fstat(group.fd(), &status) != 0) fail(errno, "cannot examine the group's directory");

@@ -75,6 +75,9 @@ class CgroupTree {
   std::vector<Child> children(const Group &group) const;
   bool hasChildren(const Group &group) const;
 
+  // The groups of other programs beside host. Throws KernelError.
+  std::vector<Child> besideHost() const;
+
   void requireAlive(const Group &group) const;
 
   // Whether living processes are in the group or below it.

@@ -5,6 +5,8 @@
 
 #include <fcntl.h>
 
+#include <utility>
+
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/lowering.h"
 #include "knob/names.h"
@@ -15,10 +17,18 @@ namespace Knob::Linux {
 namespace {
 
 struct Entry {
+  Entry(GroupId group, std::string name, size_t above)
+      : id(group), path(std::move(name)), parent(above) {}
+
   GroupId id;
   std::string path;
   size_t parent;  // index in the list; that of the first is its own
   int64_t memorySum = 0, cpuSum = 0;
+  CpuChildren cpuChildren;  // as counted, with the division that follows
+  bool isCounted = false;   // it is there, and has a record
+  Record record;
+  MachinePart guaranteed = 0;
+  int64_t weight = 0;
 };
 
 class Checker {
@@ -30,6 +40,8 @@ class Checker {
     checkLibrary();
     list();
     for (size_t i = entries_.size(); i-- > 0;) checkEntry(entries_[i]);
+    for (Entry &entry : entries_) checkCpuChildren(entry);
+    for (size_t i = entries_.size(); i-- > 0;) checkFiles(entries_[i]);
     return std::move(findings_);
   }
 
@@ -54,11 +66,11 @@ class Checker {
   }
 
   void list() {
-    entries_.push_back({tree_.host()->id, std::string(kRootName), 0});
+    entries_.emplace_back(tree_.host()->id, std::string(kRootName), 0);
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
         for (const Child &child : tree_.children(*tree_.find(entries_[i].id))) {
-          entries_.push_back({child.id, entries_[i].path + "/" + child.name, i});
+          entries_.emplace_back(child.id, entries_[i].path + "/" + child.name, i);
         }
       });
     }
@@ -74,10 +86,45 @@ class Checker {
       if (!stored.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
         checkMissingRecord(entry, *group, stored);
       }
-      if (!stored.isStored) return;
-      checkFiles(entry, *group, stored.record);
-      addToParent(entry, stored.record);
+      entry.record = stored.record;
+      entry.isCounted = stored.isStored;
+      if (&entry != &entries_.front()) addSharesTo(entries_[entry.parent], stored.record);
+      if (stored.isStored) addToParent(entry, stored.record);
     });
+  }
+
+  void addSharesTo(Entry &parent, const Record &child) {
+    parent.cpuChildren.count += 1;
+    parent.cpuChildren.shareWeight +=
+        static_cast<uint64_t>(weightOfShares(child.cpu.allocation.shares));
+  }
+
+  // From the top down: each group's division of the CPU follows from that above.
+  void checkCpuChildren(Entry &entry) {
+    Record counted = entry.record;
+    counted.cpu.childrenSum = entry.cpuSum;
+    const CpuDistribution &cpu = allocations_.cpu();
+    if (&entry == &entries_.front()) {
+      const HostCpu host = cpu.hostCpuBesideOthers(counted);
+      entry.guaranteed = host.guaranteed;
+      entry.weight = host.weight;
+      if (!host.keepsReservation) report(entry.path, cpu.tooHeavyText(), false);
+    } else {
+      const CpuDivision &division = entries_[entry.parent].cpuChildren.division;
+      entry.guaranteed = guaranteedPart(division, cpu.childOf(counted));
+      entry.weight = cpuWeightOf(division, cpu.childOf(counted));
+    }
+    entry.cpuChildren = entry.cpuSum == 0 ? CpuChildren()
+                                          : dividedAmong(entry.cpuChildren, entry.guaranteed,
+                                                         cpu.partOf(entry.cpuSum));
+    if (!entry.isCounted || entry.cpuChildren == entry.record.cpuChildren) return;
+    report(entry.path, "the CPU weights below it are for other groups or reservations", repair_);
+    if (repair_) whileThere([&] { repairCpuChildren(entry); });
+  }
+
+  void repairCpuChildren(Entry &entry) {
+    entry.record.cpuChildren = entry.cpuChildren;
+    writeRecord(tree_.find(entry.id)->fd(), entry.record);
   }
 
   void addToParent(const Entry &entry, const Record &record) {
@@ -138,12 +185,18 @@ class Checker {
            repair_);
   }
 
-  void checkFiles(const Entry &entry, Group &group, const Record &record) {
-    for (const Deviation &deviation : allocations_.deviations(group, record)) {
-      std::string trouble;
-      if (repair_) trouble = repairFile(group, record, deviation);
-      report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
-    }
+  void checkFiles(const Entry &entry) {
+    if (!entry.isCounted) return;
+    whileThere([&] {
+      const GroupPtr group = tree_.find(entry.id);
+      tree_.requireAlive(*group);
+      for (const Deviation &deviation :
+           allocations_.deviations(*group, entry.record, entry.weight)) {
+        std::string trouble;
+        if (repair_) trouble = repairFile(*group, entry.record, deviation);
+        report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
+      }
+    });
   }
 
   // Returns why it could not be repaired; empty when it was.

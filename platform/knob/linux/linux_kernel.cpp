@@ -67,7 +67,7 @@ class LinuxKernel final : public Kernel {
     const GroupPtr above = find(parent);
     const GroupPtr group = make(above, name);
     try {
-      writeRecord(group->fd(), Record());
+      allocations_.add(group, *above);
     } catch (const KernelError &) {
       removeQuietly(*group, *above);
       throw;
@@ -194,7 +194,8 @@ GroupView LinuxKernel::view(GroupId id) {
   view.usage = usageOf(*group);
   if (stored.isDamaged) view.deviation = "its record cannot be read";
   if (stored.isStored) {
-    for (const Deviation &deviation : allocations_.deviations(*group, stored.record)) {
+    const int64_t weight = allocations_.cpu().recordedWeight(*group, stored.record);
+    for (const Deviation &deviation : allocations_.deviations(*group, stored.record, weight)) {
       view.deviation += (view.deviation.empty() ? "" : "; ") + textOf(deviation);
     }
   }

@@ -678,7 +678,7 @@ TEST_F(OnLinux, AReservationHoldsAtEveryStepOfAnotherChange) {
   const GroupId id = create("host/opt", "pool");
   setMemory(id, 0, 100);
   setCpuMinOf(*open(), id, 60);
-  const auto look = [] { EXPECT_EQ(fileText("host/opt/pool", "cpu.weight"), "6000"); };
+  const auto look = [] { EXPECT_EQ(fileText("host/opt/pool", "cpu.weight"), "10000"); };
   InterruptedCalls::beforeEveryWrite(look);
   setCpu(id, 70, 2000);
   InterruptedCalls::beforeEveryWrite(nullptr);
@@ -749,6 +749,131 @@ TEST_F(OnLinux, DefaultsReplaceWhatAnotherProcessSet) {
   EXPECT_EQ(kernel_->readAllocation(id, Resource::kMemory).min, 0);
   EXPECT_EQ(fileText("host", "memory.min"), "0");
   EXPECT_TRUE(check(false).empty());
+}
+
+// ---- CPU weights beside other groups
+
+class BesideSlices : public OnLinux {
+ protected:
+  // The one that the end of the test removes.
+  static void makeSlice(int weight) {
+    ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+    write("", "cgroup.subtree_control", "+memory +cpu");
+    write("theirs", "cpu.weight", std::to_string(weight));
+  }
+};
+
+TEST_F(BesideSlices, WithoutReservationsHostHasTheWeightOfItsShares) {
+  makeSlice(10000);
+  setCpu(create("host/opt", "pool"), 50, 2000);
+  EXPECT_EQ(fileText("host", "cpu.weight"), "100");
+  EXPECT_EQ(fileText("host/opt", "cpu.weight"), "100");
+  EXPECT_EQ(fileText("host/opt/pool", "cpu.weight"), "200");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(BesideSlices, AReservationWithinTheFairPartOfHostLeavesItsWeight) {
+  makeSlice(100);
+  setCpuMin(create("host/opt", "pool"), 40);
+  EXPECT_EQ(fileText("host", "cpu.weight"), "100");
+}
+
+TEST_F(BesideSlices, ALargerReservationRaisesTheWeightOfHostAndReleasingItLowersIt) {
+  makeSlice(100);
+  const GroupId pool = create("host/opt", "pool");
+  setCpuMin(pool, 80);
+  EXPECT_EQ(fileText("host", "cpu.weight"), "433");
+  EXPECT_TRUE(check(false).empty());
+  setCpuMin(pool, 0);
+  for (const char *group : {"host", "host/opt", "host/opt/pool"}) {
+    EXPECT_EQ(fileText(group, "cpu.weight"), "100") << group;
+  }
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(BesideSlices, AReservationThatHostCannotKeepIsRefusedWithTheirNames) {
+  makeSlice(10000);
+  const GroupId pool = create("host/opt", "pool");
+  std::string text;
+  EXPECT_EQ(statusOfCall([&] { setCpuMin(pool, 60); }, &text), Status::kReservationRefused);
+  EXPECT_EQ(text, "the groups beside host weigh too much for it: theirs 10000");
+  EXPECT_EQ(fileText("host", "cpu.weight"), "100");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(BesideSlices, ASliceThatAppearsLaterIsReportedAndRepaired) {
+  setCpuMin(create("host/opt", "pool"), 80);
+  EXPECT_EQ(fileText("host", "cpu.weight"), "100");
+  makeSlice(100);
+  EXPECT_THAT(check(false), testing::Contains("host: cpu.weight is 100, not 433"));
+  EXPECT_FALSE(check(true).empty());
+  EXPECT_EQ(fileText("host", "cpu.weight"), "433");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(BesideSlices, ASliceThatChangesIsTakenIntoAccountAtTheNextChange) {
+  makeSlice(100);
+  setCpuMin(create("host/opt", "pool"), 80);
+  write("theirs", "cpu.weight", "200");
+  create("host/opt", "other");
+  EXPECT_EQ(fileText("host", "cpu.weight"), "866");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(BesideSlices, ASliceTooHeavyForAReservationIsReportedAndHindersNoRelease) {
+  makeSlice(100);
+  const GroupId pool = create("host/opt", "pool");
+  setCpuMin(pool, 80);
+  write("theirs", "cpu.weight", "9000");
+  EXPECT_THAT(check(true), testing::Contains("host: the groups beside host weigh too much for it: "
+                                             "theirs 9000"));
+  EXPECT_EQ(fileText("host", "cpu.weight"), "10000");
+  setCpuMin(pool, 70);
+  kernel_->remove(pool);
+  EXPECT_EQ(fileText("host", "cpu.weight"), "100");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, NewAndRemovedSiblingsLeaveWeightsThatCheckFindsRight) {
+  setCpuMin(create("host/opt", "pool"), 30);
+  std::vector<GroupId> siblings;
+  for (int i = 0; i < 20; ++i) siblings.push_back(create("host/opt", "s" + std::to_string(i)));
+  EXPECT_TRUE(check(false).empty());
+  setCpuMin(siblings[3], 10);
+  setCpu(siblings[4], -1, -4);
+  setCpuMin(kernel_->create(siblings[5], "below"), 5);
+  EXPECT_TRUE(check(false).empty());
+  kernel_->remove(kernel_->lookUp("host/opt/s5/below"));
+  for (const GroupId sibling : siblings) kernel_->remove(sibling);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AWriteThatFailsLeavesAllCpuWeightsAsTheyWere) {
+  setCpuMin(create("host/opt", "pool"), 30);
+  for (int i = 0; i < 8; ++i) create("host/opt", "s" + std::to_string(i));
+  const auto weights = [] {
+    std::vector<std::string> all = {fileText("host", "cpu.weight")};
+    for (const auto &entry : std::filesystem::directory_iterator(kMount / "host/opt")) {
+      if (entry.is_directory()) {
+        all.push_back(fileText("host/opt" / entry.path().filename(), "cpu.weight"));
+      }
+    }
+    return all;
+  };
+  const std::vector<std::string> before = weights();
+  const GroupId last = kernel_->lookUp("host/opt/s7");
+  for (int failing = 1; failing < 100; ++failing) {
+    InterruptedCalls::failWrite(failing);
+    const Status status = statusOfCall([&] { setCpuMin(last, 20); });
+    InterruptedCalls::failWrite(0);
+    if (status == Status::kSuccess) {
+      EXPECT_GT(failing, 3);
+      return;
+    }
+    ASSERT_EQ(weights(), before) << "write " << failing;
+    ASSERT_TRUE(check(false).empty()) << "write " << failing;
+  }
+  FAIL() << "it never succeeded";
 }
 
 }  // namespace
