@@ -23,6 +23,14 @@ struct CloseFolder {
   throw std::system_error(errno, std::generic_category(), kDefinitionFolder);
 }
 
+// Newer releases of the yaml library add the path, which the file error contains anyway.
+std::string bareMessage(const YAML::Exception &error) {
+  if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
+  return error.msg;
+}
+
+}  // namespace
+
 // An entry's type is the one in the listing. Symbolic links, folders and entries of unknown type
 // are skipped.
 std::vector<std::string> listDefinitionFolder() {
@@ -49,14 +57,6 @@ bool isInstalled(const std::string &path) {
   }
   return false;
 }
-
-// Newer releases of the yaml library add the path, which the file error contains anyway.
-std::string bareMessage(const YAML::Exception &error) {
-  if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
-  return error.msg;
-}
-
-}  // namespace
 
 PoolList readFile(const std::string &path) {
   try {

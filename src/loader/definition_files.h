@@ -20,6 +20,13 @@ constexpr const char *kDefinitionFolder = "/etc/rp.d";
 // second name counts only where the file system does not support the first.
 constexpr const char *kInstalledMarks[] = {"orrery.installed", "user.orrery.installed"};
 
+// The paths of the files of the definition folder, in no fixed order. Throws std::system_error if the
+// folder cannot be read.
+std::vector<std::string> listDefinitionFolder();
+
+// Whether the file at that path carries the installed mark. A file that does not exist does not.
+bool isInstalled(const std::string &path);
+
 // The pools of the named files, or of all files in the definition folder if none is named, sorted
 // by name. Pools of equal names are in no fixed order. Throws Loader::FileError, which names the
 // file and holds the cause as a nested exception, or std::system_error if the folder cannot be
