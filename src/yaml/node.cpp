@@ -7,13 +7,14 @@
 namespace Yaml {
 namespace {
 
-// Older releases construct the error without arguments, newer ones from the requested key.
+// Older releases construct these errors without arguments, newer ones from a text: the requested
+// key, or the path of the file.
 template <typename Error>
-Error plainInvalidNode() {
+Error errorFrom(const std::string &text) {
   if constexpr (std::is_default_constructible_v<Error>) {
     return Error();
   } else {
-    return Error(std::string());
+    return Error(text);
   }
 }
 
@@ -36,7 +37,11 @@ bool hasExplicitTag(const YAML::Node &node) {
 }  // namespace
 
 void throwInvalidNode() {
-  throw plainInvalidNode<YAML::InvalidNode>();
+  throw errorFrom<YAML::InvalidNode>({});
+}
+
+void throwBadFile(const std::string &path) {
+  throw errorFrom<YAML::BadFile>(path);
 }
 
 void requireValid(const YAML::Node &node) {

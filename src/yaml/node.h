@@ -12,7 +12,10 @@ namespace Yaml {
 // Throws the yaml library's invalid-node error with the text that does not name a key.
 [[noreturn]] void throwInvalidNode();
 
-// Throws that error when the node is not valid.
+// Throws the yaml library's error for a file that cannot be read.
+[[noreturn]] void throwBadFile(const std::string &path);
+
+// Throws the invalid-node error when the node is not valid.
 void requireValid(const YAML::Node &node);
 
 // Whether the node is null. A plain ~ or null after a tag is null too; a quoted one is not, where
