@@ -5,11 +5,12 @@
 #include <memory>
 #include <new>
 #include <string>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
 #include "knob/live_kernel.h"
-#include "knob/node_ids.h"
+#include "knob/node_list.h"
 #include "knob/node_table.h"
 #include "knob/param_list.h"
 #include "knob/signature.h"
@@ -58,18 +59,12 @@ extern "C" {
 
 #pragma GCC visibility push(default)
 
-const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo = Knob::kCpuInfoNode;
-const KNOB_NodeID KNOB_NODE_system_vmLimits = Knob::kVmLimitsNode;
-const KNOB_NodeID KNOB_NODE_system_bootCmdLine = Knob::kBootCmdLineNode;
-const KNOB_NodeID KNOB_NODE_memory_comprehensive = Knob::kMemoryNode;
-const KNOB_NodeID KNOB_NODE_sched_groupPathNameToID = Knob::kPathToIdNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_groupCreate = Knob::kGroupCreateNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_delete = Knob::kGroupDeleteNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_memAllocationInMB = Knob::kMemAllocationNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_cpuAllocationInPct = Knob::kCpuAllocationNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_members_groups = Knob::kMemberGroupsNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_members_worlds = Knob::kMemberWorldsNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_stats_memoryStats = Knob::kMemoryStatsNode;
+// A node that knob.h does not declare is an error here: its object would not be exported.
+#define KNOB_EXPORT_NODE(name, number, node)                                     \
+  static_assert(std::is_same_v<decltype(KNOB_NODE_##name), const KNOB_NodeID>);  \
+  const KNOB_NodeID KNOB_NODE_##name = number;
+KNOB_NODE_LIST(KNOB_EXPORT_NODE)
+#undef KNOB_EXPORT_NODE
 
 int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
   Knob::BuildSignature running, own;
@@ -78,7 +73,7 @@ int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
     own = Knob::buildSignature();
     running = LiveKernel::instance().with([](Kernel &kernel) { return kernel.signature(); });
   });
-  if (status != 0 || running.md5 == own.md5) return 0;
+  if (status != 0 || Knob::sameInterface(running, own)) return 0;
 
   if (runningBuild != nullptr && size > 0) {
     (void)std::snprintf(runningBuild, static_cast<size_t>(size), "%s", running.buildDate.c_str());

@@ -6,7 +6,6 @@
 #include <cstring>
 
 #include "knob/allocation.h"
-#include "knob/node_ids.h"
 #include "knob/param_list.h"
 #include "platform/knob_records.h"
 
@@ -103,28 +102,29 @@ std::vector<int64_t> listMembers(Kernel &kernel, GroupId group) {
   return kernel.members(group);
 }
 
-constexpr InputShape kNoInput = InputShape::kNothing;
+constexpr Node machineNode() {
+  return {};
+}
 
-// id, of a group, get and its size, set with its input and the size of its answer, list
-constexpr std::array<Node, kNodeCount> kNodes = {
-    Node{kCpuInfoNode, false, getCpuInfo, sizeof(KNOB_CpuInfo), nullptr, kNoInput, 0, nullptr},
-    Node{kVmLimitsNode, false, getVmLimits, sizeof(KNOB_VmLimits), nullptr, kNoInput, 0, nullptr},
-    Node{kBootCmdLineNode, false, getBootCommandLine, sizeof(KNOB_BootCommandLine), nullptr,
-         kNoInput, 0, nullptr},
-    Node{kMemoryNode, false, getMemory, sizeof(KNOB_MemoryInfo), nullptr, kNoInput, 0, nullptr},
-    Node{kPathToIdNode, false, nullptr, 0, lookUp, InputShape::kOneText, sizeof(GroupId), nullptr},
-    Node{kGroupCreateNode, true, nullptr, 0, create, InputShape::kOneText, sizeof(GroupId),
-         nullptr},
-    Node{kGroupDeleteNode, true, nullptr, 0, remove, kNoInput, 0, nullptr},
-    Node{kMemAllocationNode, true, getMemoryAllocation, sizeof(KNOB_MemAllocation),
-         setAllocation<Resource::kMemory>, InputShape::kSettings, 0, nullptr},
-    Node{kCpuAllocationNode, true, getCpuAllocation, sizeof(KNOB_CpuAllocation),
-         setAllocation<Resource::kCpu>, InputShape::kSettings, 0, nullptr},
-    Node{kMemberGroupsNode, true, nullptr, 0, nullptr, kNoInput, 0, listGroups},
-    Node{kMemberWorldsNode, true, nullptr, 0, join, InputShape::kOneInt, 0, listMembers},
-    Node{kMemoryStatsNode, true, getMemoryStatistics, sizeof(KNOB_MemoryStats), nullptr, kNoInput,
-         0, nullptr},
-};
+constexpr Node groupNode() {
+  Node node;
+  node.ofGroup = true;
+  return node;
+}
+
+#define KNOB_TABLE_ROW(name, number, node) (node).numbered(number),
+constexpr std::array<Node, kNodeCount> kNodes = {KNOB_NODE_LIST(KNOB_TABLE_ROW)};
+#undef KNOB_TABLE_ROW
+
+constexpr bool hasNumberTwice() {
+  for (size_t i = 0; i < kNodes.size(); ++i) {
+    for (size_t j = 0; j < i; ++j) {
+      if (kNodes[i].id == kNodes[j].id) return true;
+    }
+  }
+  return false;
+}
+static_assert(!hasNumberTwice());
 
 const Node &nodeOf(KNOB_NodeID id) {
   const auto node =

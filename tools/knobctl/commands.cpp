@@ -11,8 +11,8 @@
 #include <string>
 #include <string_view>
 
-#include "knobctl/condition.h"
 #include "knobctl/kernel_access.h"
+#include "knobctl/kernel_report.h"
 #include "knobctl/start.h"
 #include "knobctl/tree.h"
 #include "shared/command_table.h"
@@ -57,9 +57,9 @@ ExitStatus boot(const Words &words) {
 }
 
 ExitStatus status(const Words &) {
-  const Condition condition = lookAtKernel();
-  for (const auto &[label, text] : condition.lines) printLine(label, text);
-  if (!condition.problem.empty()) throw Tools::Failure(Tools::kExitFailure, condition.problem);
+  const KernelReport report = reportOnKernel();
+  for (const auto &[label, text] : report.lines) printLine(label, text);
+  if (!report.problem.empty()) throw Tools::Failure(Tools::kExitFailure, report.problem);
   return Tools::kExitSuccess;
 }
 

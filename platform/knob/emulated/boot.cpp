@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// Starts the emulated kernel: the first use does it with this machine's facts, knobctl with others.
+// Collects the facts of a boot and writes them into a new state or over the old one.
+#include "knob/emulated/boot.h"
+
 #include <ctime>
 
 #include "knob/emulated/boot_record.h"
-#include "knob/emulated/emulated_kernel.h"
-#include "knob/emulated/first_use.h"
 #include "knob/emulated/schema.h"
 #include "knob/emulated/state_file.h"
 #include "knob/machine_facts.h"
@@ -17,13 +17,13 @@ using Platform::Database;
 using Platform::Run;
 using Platform::Statement;
 
-constexpr size_t kLongestCommandLine = 4095;
+constexpr size_t kMaxCommandLineBytes = 4095;
 
 HostFacts factsToBootWith(const BootFacts &wanted) {
-  constexpr uint64_t kMostMB = UINT64_MAX / 1024;
+  constexpr uint64_t kMaxMB = UINT64_MAX / 1024;
   HostFacts facts = readMachineFacts();
   if (wanted.cpus) facts.cpus = *wanted.cpus;
-  if (wanted.memoryMB && *wanted.memoryMB > kMostMB) {
+  if (wanted.memoryMB && *wanted.memoryMB > kMaxMB) {
     throw KernelError(Status::kBadParameter, "more memory than can be counted in KB");
   }
   if (wanted.memoryMB) facts.memoryKB = *wanted.memoryMB * 1024;
@@ -32,11 +32,11 @@ HostFacts factsToBootWith(const BootFacts &wanted) {
 
   if (facts.cpus == 0) throw KernelError(Status::kBadParameter, "a machine has at least one CPU");
   if (facts.memoryKB == 0) throw KernelError(Status::kBadParameter, "a machine has some memory");
-  if (facts.bootCommandLine.size() > kLongestCommandLine) {
+  if (facts.bootCommandLine.size() > kMaxCommandLineBytes) {
     if (wanted.commandLine) {
       throw KernelError(Status::kBadParameter, "a command line has at most 4095 bytes");
     }
-    facts.bootCommandLine.resize(kLongestCommandLine);
+    facts.bootCommandLine.resize(kMaxCommandLineBytes);
   }
   return facts;
 }

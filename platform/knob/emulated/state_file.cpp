@@ -100,6 +100,10 @@ std::string defaultStatePath() {
   return folder + "/kernel.db";
 }
 
+std::string emulatedStatePath(const Configuration &configuration) {
+  return configuration.statePath ? *configuration.statePath : defaultStatePath();
+}
+
 bool stateExists(const std::string &path) {
   struct stat status {};
   if (::stat(path.c_str(), &status) != 0) {

@@ -165,13 +165,17 @@ TEST_F(Abi, NodesHaveNumbersOfTheirOwn) {
 
 class Signature : public Abi {
  protected:
-  void bootByAnotherBuild() {
+  // Boots a kernel and changes what it keeps of its library.
+  void bootBy(const char *change) {
     int64_t id = 0;
     ASSERT_EQ(lookUp(&id), 0U);
     LiveKernel::instance().close();
     Platform::Database(state_, Platform::Database::Mode::kReadWrite, 0)
-        .execute("UPDATE kernel SET md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
+        .execute((std::string("UPDATE kernel SET ") + change).c_str());
     ASSERT_TRUE(std::filesystem::remove(state_ + "-facts"));
+  }
+  void bootByAnotherInterface() {
+    bootBy("md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
   }
 };
 
@@ -183,8 +187,16 @@ TEST_F(Signature, TheSameBuildMatches) {
   EXPECT_EQ(mine, nullptr);
 }
 
+TEST_F(Signature, AnotherBuildDateAloneMatches) {
+  bootBy("build_date = 'Jan  1 2001 01:02:03'");
+  char running[21] = "untouched";
+  const char *mine = nullptr;
+  EXPECT_EQ(KNOB_CheckSig(running, sizeof(running), &mine), 0);
+  EXPECT_STREQ(running, "untouched");
+}
+
 TEST_F(Signature, AnotherInterfaceIsAMismatchWithBothDates) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[21];
   const char *mine = nullptr;
   EXPECT_NE(KNOB_CheckSig(running, sizeof(running), &mine), 0);
@@ -193,7 +205,7 @@ TEST_F(Signature, AnotherInterfaceIsAMismatchWithBothDates) {
 }
 
 TEST_F(Signature, ASmallBufferGetsWhatFits) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[] = "xxxxxxxx";
   const char *mine = nullptr;
   EXPECT_NE(KNOB_CheckSig(running, 4, &mine), 0);
@@ -202,7 +214,7 @@ TEST_F(Signature, ASmallBufferGetsWhatFits) {
 }
 
 TEST_F(Signature, NullBuffersAreAllowed) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[] = "x";
   EXPECT_NE(KNOB_CheckSig(nullptr, 21, nullptr), 0);
   EXPECT_NE(KNOB_CheckSig(running, 0, nullptr), 0);

@@ -10,6 +10,7 @@
 #include <functional>
 
 #include "common/sqlite.h"
+#include "knob/emulated/boot.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "knob/emulated/state_file.h"
 #include "knob/machine_facts.h"
