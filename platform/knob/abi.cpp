@@ -1,7 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// The C functions of the interface. Nothing else in the library is visible from outside, and no
-// exception passes here.
+// The C functions of the interface, and the only symbols that the library exports. No exception
+// leaves them.
 #include <cstdio>
+#include <exception>
 #include <memory>
 #include <new>
 #include <string>
@@ -9,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "knob/last_failure.h"
 #include "knob/live_kernel.h"
 #include "knob/node_list.h"
 #include "knob/node_table.h"
@@ -16,6 +18,7 @@
 #include "knob/signature.h"
 #include "knob/status.h"
 #include "platform/knob.h"
+#include "platform/knob_status.h"
 
 using Knob::Kernel;
 using Knob::LiveKernel;
@@ -23,25 +26,32 @@ using Knob::Status;
 
 namespace {
 
-// Runs the body of a function; what it throws becomes the status.
+// Runs the body of a function. What it throws becomes the status, and the reason is kept for the
+// status's text.
 template <typename F>
 KNOB_ReturnStatus guarded(const F &body) noexcept {
+  Knob::forgetFailure();
   try {
     body();
-    return static_cast<KNOB_ReturnStatus>(Status::kSuccess);
+    return KNOB_STATUS_SUCCESS;
   } catch (const Knob::KernelError &error) {
-    return static_cast<KNOB_ReturnStatus>(error.status);
+    const auto status = static_cast<KNOB_ReturnStatus>(error.status);
+    Knob::rememberFailure(status, error.what());
+    return status;
   } catch (const std::bad_alloc &) {
-    return static_cast<KNOB_ReturnStatus>(Status::kOutOfMemory);
+    return KNOB_STATUS_OUT_OF_MEMORY;
+  } catch (const std::exception &error) {
+    Knob::rememberFailure(KNOB_STATUS_FAILURE, error.what());
+    return KNOB_STATUS_FAILURE;
   } catch (...) {
-    return static_cast<KNOB_ReturnStatus>(Status::kFailure);
+    return KNOB_STATUS_FAILURE;
   }
 }
 
 template <typename Value>
 void append(KNOB_ParamList *list, const Value &value) {
   if (list == nullptr || list->entries.size() >= list->capacity) {
-    throw Knob::KernelError(Status::kBadParameter);
+    throw Knob::KernelError(Status::kBadParameter, list == nullptr ? "no list" : "the list is full");
   }
   list->entries.emplace_back(std::in_place_type<Value>, value);
 }
@@ -68,11 +78,12 @@ KNOB_NODE_LIST(KNOB_EXPORT_NODE)
 
 int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
   Knob::BuildSignature running, own;
-  // A kernel that is not usable has no signature to differ in; the calls that follow say so.
+  // A kernel that is not usable has no signature to compare; the calls that follow fail.
   const KNOB_ReturnStatus status = guarded([&] {
     own = Knob::buildSignature();
     running = LiveKernel::instance().with([](Kernel &kernel) { return kernel.signature(); });
   });
+  Knob::forgetFailure();  // the result is not a status
   if (status != 0 || Knob::sameInterface(running, own)) return 0;
 
   if (runningBuild != nullptr && size > 0) {
@@ -83,6 +94,7 @@ int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
 }
 
 KNOB_ParamList *KNOB_ParamListCreate(int kind, int capacity) {
+  Knob::forgetFailure();  // a caller reports a null list as a status of its own choice
   const bool known = kind == static_cast<int>(Knob::ListKind::kInput) ||
                      kind == static_cast<int>(Knob::ListKind::kInstance);
   if (!known || capacity < 0) return nullptr;
@@ -96,11 +108,12 @@ KNOB_ReturnStatus KNOB_ParamListAddInt(KNOB_ParamList *list, int64_t value) {
 
 KNOB_ReturnStatus KNOB_ParamListAddString(KNOB_ParamList *list, const char *text) {
   return guarded([&] {
-    if (text == nullptr) throw Knob::KernelError(Status::kBadParameter);
+    if (text == nullptr) throw Knob::KernelError(Status::kBadParameter, "no text");
     append(list, std::string(text));
   });
 }
 
+// Keeps the reason of the last failure: programs destroy their lists before they ask for its text.
 void KNOB_ParamListDestroy(KNOB_ParamList *list) {
   delete list;
 }
@@ -136,7 +149,7 @@ KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamLi
 }
 
 const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status) {
-  return Knob::statusText(status);
+  return Knob::explainedStatusText(status);
 }
 
 #pragma GCC visibility pop

@@ -8,7 +8,7 @@
 namespace Knob {
 namespace {
 
-constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
+constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
 
 bool withinOwnLimits(const ResourceState &state) {
   const int64_t reservation = reservationOf(state);
@@ -20,7 +20,7 @@ bool withinOwnLimits(const ResourceState &state) {
 // The sum after one child's part of it went from before to after; before is part of the sum.
 int64_t replaced(int64_t sum, int64_t before, int64_t after) {
   const int64_t others = sum - before;
-  return after > kMost - others ? kMost : others + after;
+  return after > kMax - others ? kMax : others + after;
 }
 
 }  // namespace

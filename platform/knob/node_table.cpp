@@ -1,9 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// The table of nodes, and the checks that every row gets alike.
+// What each node does, and the checks that apply to every node.
 #include "knob/node_table.h"
 
 #include <algorithm>
 #include <cstring>
+#include <string>
 
 #include "knob/allocation.h"
 #include "knob/param_list.h"
@@ -12,7 +13,7 @@
 namespace Knob {
 namespace {
 
-// A caller's buffer may stand at any address.
+// A caller's buffer may have any alignment.
 template <typename Record>
 void write(const NodeCall &call, const Record &record) {
   std::memcpy(call.output, &record, sizeof(record));
@@ -129,12 +130,12 @@ static_assert(!hasNumberTwice());
 const Node &nodeOf(KNOB_NodeID id) {
   const auto node =
       std::find_if(kNodes.begin(), kNodes.end(), [id](const Node &row) { return row.id == id; });
-  if (node == kNodes.end()) throw KernelError(Status::kBadNode);
+  if (node == kNodes.end()) throw KernelError(Status::kBadNode, "number " + std::to_string(id));
   return *node;
 }
 
 void requireSupport(bool supported) {
-  if (!supported) throw KernelError(Status::kNotSupported);
+  if (!supported) throw KernelError(Status::kNotSupported, "the node has no such call");
 }
 
 GroupId instanceOf(const Node &node, const KNOB_ParamList *instance) {
@@ -145,7 +146,9 @@ GroupId instanceOf(const Node &node, const KNOB_ParamList *instance) {
 
 void requireOutput(const void *output, size_t size, size_t needed) {
   if (needed == 0) return;
-  if (output == nullptr || size < needed) throw KernelError(Status::kBufferSize);
+  if (output == nullptr || size < needed) {
+    throw KernelError(Status::kBufferSize, std::to_string(needed) + " bytes are needed");
+  }
 }
 
 void takeInput(const Node &node, const KNOB_ParamList *input, NodeCall &call) {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Looks texts up; the texts themselves stand in the header's table.
+// Finds the text of a status; the texts themselves are in the header's table.
 #include "knob/status.h"
 
 #include <cstdio>

@@ -47,11 +47,11 @@ inline constexpr std::array kStatusTexts = {
     StatusText{
         Status::kReservationRefused,
         "reservation refused: more than the group, one above it or the machine has room for"},
-    StatusText{Status::kKernelNotUsable, "kernel not usable (`knobctl status` tells why)"},
+    StatusText{Status::kKernelNotUsable, "kernel not usable (see `knobctl status`)"},
 };
 
-// The text of a status. One that the table does not have gets a text with its number, which lasts
-// until the calling thread asks for another.
+// The text of a status. For a status that is not in the table, a text with its number, valid until
+// the calling thread asks for another.
 const char *statusText(uint32_t status) noexcept;
 
 }  // namespace Knob

@@ -101,7 +101,7 @@ TEST_F(ExecInPool, AHostWithoutControlGroupsIsNotUsable) {
       {"--mount", "/bin/sh", "-c", "umount /sys/fs/cgroup; exec poolctl-exec web -- true"});
   EXPECT_EQ(result.status, 125);
   EXPECT_EQ(result.err,
-            "poolctl-exec: host/opt/web: kernel not usable (`knobctl status` tells why)\n");
+            "poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`)\n");
 }
 
 }  // namespace

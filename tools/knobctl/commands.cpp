@@ -185,8 +185,8 @@ void checkWords(CLI::App &command, Words *words) {
 
 // The parser alone would take the largest number for one that is larger still.
 bool isProcessNumber(const std::string &text) {
-  constexpr size_t kMostDigits = 18;
-  return text.size() <= kMostDigits && text.find_first_not_of("0123456789") == std::string::npos &&
+  constexpr size_t kMaxDigits = 18;
+  return text.size() <= kMaxDigits && text.find_first_not_of("0123456789") == std::string::npos &&
          text.find_first_not_of('0') != std::string::npos;
 }
 

@@ -21,18 +21,24 @@ Tools::ExitStatus exitStatus(Knob::Status status) {
   }
 }
 
-// The status's own text sends people to knobctl; here the reason itself is at hand.
+// The status's own text refers people to knobctl; here the reason follows.
 std::string statusWords(Knob::Status status) {
   if (status == Knob::Status::kKernelNotUsable) return "kernel not usable";
   return Knob::statusText(static_cast<uint32_t>(status));
+}
+
+bool endsWith(const std::string &text, const std::string &end) {
+  return text.size() >= end.size() &&
+         text.compare(text.size() - end.size(), end.size(), end) == 0;
 }
 
 }  // namespace
 
 Tools::Failure failure(const std::string &what, const Knob::KernelError &error) {
   std::string text = Tools::printable(what) + ": " + statusWords(error.status);
-  const std::string detail = error.what();
-  if (!detail.empty()) text += ": " + Tools::printable(detail);
+  const std::string reason = error.what();
+  const bool isNamed = endsWith(what, reason);  // "stats host/a: not found" needs no second host/a
+  if (!isNamed) text += ": " + Tools::printable(reason);
   return {exitStatus(error.status), text};
 }
 

@@ -9,7 +9,6 @@
 
 #include "knob/admission.h"
 #include "knob/emulated/group_store.h"
-#include "knob/emulated/processes.h"
 #include "knob/emulated/schema.h"
 #include "knob/peaks.h"
 

@@ -1,16 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
-// The operations. Each checks all that it needs, then changes all that it has to.
+// The operations. Each checks everything first and then makes all its changes.
 #include "knob/emulated/emulated_kernel.h"
 
 #include <algorithm>
 #include <optional>
 
+#include "common/process.h"
 #include "knob/admission.h"
 #include "knob/allocation.h"
 #include "knob/emulated/boot.h"
 #include "knob/emulated/boot_record.h"
 #include "knob/emulated/check.h"
-#include "knob/emulated/processes.h"
 #include "knob/emulated/schema.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
@@ -18,12 +18,12 @@
 namespace Knob {
 namespace {
 
-[[noreturn]] void notFound() {
-  throw KernelError(Status::kNotFound);
+[[noreturn]] void notFound(GroupId id) {
+  throw KernelError(Status::kNotFound, "group " + std::to_string(id));
 }
 
 bool lives(const Member &member) {
-  return processStart(member.pid) == member.started;
+  return Platform::processStart(member.pid) == member.started;
 }
 
 std::vector<Member> onlyLiving(std::vector<Member> members) {
@@ -35,7 +35,7 @@ std::vector<Member> onlyLiving(std::vector<Member> members) {
 
 uint64_t residentBytesOf(const std::vector<Member> &members) {
   uint64_t bytes = 0;
-  for (const Member &member : members) bytes += residentBytes(member.pid);
+  for (const Member &member : members) bytes += Platform::residentBytes(member.pid);
   return bytes;
 }
 
@@ -78,13 +78,19 @@ auto EmulatedKernel::transact(Kind kind, const F &operation) {
 
 GroupId EmulatedKernel::lookUp(std::string_view path) {
   const auto components = splitPath(path);
-  if (!components || components->front() != kRootName) notFound();
-
+  if (!components || components->front() != kRootName) {
+    throw KernelError(Status::kNotFound, std::string(path));
+  }
   const auto walk = [&] {
     GroupId id = kHostId;
     for (size_t i = 1; i < components->size(); ++i) {
-      const auto child = store().child(id, (*components)[i]);
-      if (!child) notFound();
+      const std::string_view name = (*components)[i];
+      const auto child = store().child(id, name);
+      if (!child) {
+        // The views point into the path.
+        const auto length = static_cast<size_t>(name.data() + name.size() - path.data());
+        throw KernelError(Status::kNotFound, std::string(path.substr(0, length)));
+      }
       id = *child;
     }
     return id;
@@ -94,9 +100,9 @@ GroupId EmulatedKernel::lookUp(std::string_view path) {
 }
 
 GroupId EmulatedKernel::create(GroupId parent, std::string_view name) {
-  if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
+  if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "\"" + std::string(name) + "\" cannot name a group");
   return transact(Kind::kWrite, [&] {
-    if (!store().exists(parent)) notFound();
+    if (!store().exists(parent)) notFound(parent);
     if (store().child(parent, name)) throw KernelError(Status::kExists);
     if (!livingMembers(parent).empty()) {
       throw KernelError(Status::kBusy, "processes are in the parent group");
@@ -108,7 +114,7 @@ GroupId EmulatedKernel::create(GroupId parent, std::string_view name) {
 
 void EmulatedKernel::remove(GroupId id) {
   if (id == kHostId || id == kOptId) {
-    throw KernelError(Status::kPermissionDenied, "the group is there for good");
+    throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be deleted");
   }
   transact(Kind::kWrite, [&] {
     const ResourceRow memory = require(id, Resource::kMemory);
@@ -143,14 +149,14 @@ void EmulatedKernel::setAllocation(GroupId id, Resource resource, const Allocati
 std::vector<GroupId> EmulatedKernel::childGroups(GroupId id) {
   return transact(Kind::kRead, [&] {
     std::vector<GroupId> children = store().children(id);
-    if (children.empty() && !store().exists(id)) notFound();
+    if (children.empty() && !store().exists(id)) notFound(id);
     return children;
   });
 }
 
 std::vector<int64_t> EmulatedKernel::members(GroupId id) {
   return transact(Kind::kRead, [&] {
-    if (!store().exists(id)) notFound();
+    if (!store().exists(id)) notFound(id);
     std::vector<int64_t> pids;
     for (const Member &member : livingMembers(id)) pids.push_back(member.pid);
     return pids;
@@ -159,12 +165,12 @@ std::vector<int64_t> EmulatedKernel::members(GroupId id) {
 
 void EmulatedKernel::join(GroupId id, int64_t pid) {
   transact(Kind::kWrite, [&] {
-    if (!store().exists(id)) notFound();
+    if (!store().exists(id)) notFound(id);
     if (store().hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
     requireAnyMemory(id);
-    const auto started = processStart(pid);
-    if (!started) throw KernelError(Status::kNotFound, "no living process of that id");
-    // Here a write is due anyway, so that what is left of the dead goes with it.
+    const auto started = Platform::processStart(pid);
+    if (!started) throw KernelError(Status::kNotFound, "process " + std::to_string(pid));
+    // This call writes anyway, so it also removes the dead members.
     for (const Member &member : store().membersOf(id)) {
       if (!lives(member)) store().removeMember(member.pid);
     }
@@ -217,7 +223,7 @@ std::vector<Finding> EmulatedKernel::check(bool repair) {
 
 ResourceRow EmulatedKernel::require(GroupId id, Resource resource) {
   const auto row = store().read(id, resource);
-  if (!row) notFound();
+  if (!row) notFound(id);
   return *row;
 }
 
@@ -227,7 +233,7 @@ void EmulatedKernel::reserve(GroupId id, Resource resource, const ResourceRow &r
   std::vector<GroupId> ids = {id};
   std::vector<MemoryStatistics> peaks = {row.peaks};
 
-  // Where the group's own reservation stays, nothing above it can change.
+  // While the group's own reservation stays the same, nothing changes above it.
   const bool changes = reservationOf({wanted, row.state.childrenSum}) != reservationOf(row.state);
   for (GroupId above = row.parent; changes && above != 0;) {
     const ResourceRow aboveRow = require(above, resource);
@@ -272,7 +278,7 @@ bool EmulatedKernel::isBelow(GroupId id, GroupId ancestor) {
   return id == ancestor;
 }
 
-// A group that may have none has none for its child groups and processes either.
+// A maximum of 0 leaves no memory for child groups and processes either.
 void EmulatedKernel::requireAnyMemory(GroupId id) {
   for (ResourceRow row; id != 0; id = row.parent) {
     row = require(id, Resource::kMemory);

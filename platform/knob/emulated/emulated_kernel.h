@@ -17,7 +17,7 @@ namespace Knob {
 
 class EmulatedKernel final : public Kernel {
  public:
-  // maxVms: of a kernel that was booted without a number of its own.
+  // maxVms: for a kernel that was booted without one.
   EmulatedKernel(std::string path, uint32_t maxVms);
 
   // Opens the state, unless it is open. Throws KernelError (kernel not usable).
@@ -48,8 +48,8 @@ class EmulatedKernel final : public Kernel {
   auto alone(const F &operation);
 
   ResourceRow require(GroupId id, Resource resource);
-  // Makes room, in every group above, for what the group reserves with the wanted allocation.
-  // Refused: nothing has changed.
+  // Adds what the group reserves with the wanted allocation to the sums of all groups above it.
+  // Throws reservation refused; then nothing has changed.
   void reserve(GroupId id, Resource resource, const ResourceRow &row, const Allocation &wanted);
   std::vector<Member> livingMembers(GroupId id);
   std::vector<Member> livingBelow(GroupId id);
@@ -57,7 +57,7 @@ class EmulatedKernel final : public Kernel {
   void requireAnyMemory(GroupId id);
   void requireMemoryFor(GroupId id, int64_t maxMB);
 
-  // Everything that an open state needs, opened with the first operation that asks for it.
+  // Everything that an open state needs, opened by the first operation that needs it.
   struct State {
     explicit State(const std::string &path);
     Platform::Database database;

@@ -140,7 +140,7 @@ TEST_F(Exec, NorDoesOneBelowADisabledPool) {
 TEST_F(Exec, AKernelThatIsNotUsableIsSaidSo) {
   writeFile(world.folder() / "knob.conf", "kernel = none\n");
   expectOwnFailure({"web", "--", "true"},
-                   "poolctl-exec: host/opt/web: kernel not usable (`knobctl status` tells why)\n");
+                   "poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`)\n");
 }
 
 TEST_F(Exec, WrongUsageEndsWith125) {
