@@ -14,7 +14,7 @@ namespace Knob {
 namespace {
 
 using Platform::Database;
-using Platform::Run;
+using Platform::Query;
 using Platform::Statement;
 
 constexpr size_t kMaxCommandLineBytes = 4095;
@@ -53,19 +53,19 @@ void writeBoot(Database &database, const BootRecord &record) {
                    "build_date) VALUES (1, ?, ?, ?, ?, ?, ?, ?)");
   const HostFacts &facts = record.facts;
   // KB of 2^63 and more are kept as negative numbers and read back as what they were.
-  Run(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
+  Query(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
       facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
       .finish();
   if (!record.maxVms) return;
   Statement setMaxVms(database, "UPDATE kernel SET max_vms = ?");
-  Run(setMaxVms, int64_t{*record.maxVms}).finish();
+  Query(setMaxVms, int64_t{*record.maxVms}).finish();
 }
 
 void refuseWhileGroupsExist(Database &database) {
   Statement statement(database, "SELECT COUNT(*) FROM groups WHERE id NOT IN (?, ?)");
-  Run run(statement, kHostId, kOptId);
-  if (run.step() && run.integer(0) > 0) {
-    throw KernelError(Status::kBusy, "the kernel has " + std::to_string(run.integer(0)) +
+  Query query(statement, kHostId, kOptId);
+  if (query.step() && query.integer(0) > 0) {
+    throw KernelError(Status::kBusy, "the kernel has " + std::to_string(query.integer(0)) +
                                          " groups; only force ends them");
   }
 }
@@ -85,7 +85,7 @@ void rebootState(const std::string &path, const BootRecord &record, bool force) 
 // faster than a thousand in a second.
 void skipLostIds(Database &database) {
   Statement statement(database, "UPDATE sqlite_sequence SET seq = ? WHERE name = 'groups'");
-  Run(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
+  Query(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
 }
 
 void makeState(const BootLock &lock, const std::string &path, const BootRecord &record,
