@@ -104,8 +104,7 @@ std::optional<std::string> KeyValueFile::oneOf(
   return value;
 }
 
-std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t min,
-                                             int64_t max) const {
+std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t min, int64_t max) const {
   const Entry *entry = find(key);
   if (entry == nullptr) return std::nullopt;
   const auto number = parseNumber<int64_t>(entry->value);

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// SQLite with owners: a Database, its Statements, one Query of a statement, and a Transaction that is
-// rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
+// SQLite with owners: a Database, its Statements, one Query of a statement, and a Transaction that
+// is rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
 //
 // Declare a Database before its Statements: they must be released before it.
 #pragma once

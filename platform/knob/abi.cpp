@@ -26,32 +26,35 @@ using Knob::Status;
 
 namespace {
 
-// Runs the body of a function. What it throws becomes the status, and the reason is kept for the
-// status's text.
+// Keeps why the calling thread's call failed, for the text of the status. A failure without a
+// reason forgets the one before.
+KNOB_ReturnStatus failed(KNOB_ReturnStatus status, const char *reason) noexcept {
+  Knob::rememberFailure(status, reason);
+  return status;
+}
+
+// Runs the body of a function; what it throws becomes the status.
 template <typename F>
 KNOB_ReturnStatus guarded(const F &body) noexcept {
-  Knob::forgetFailure();
   try {
     body();
     return KNOB_STATUS_SUCCESS;
   } catch (const Knob::KernelError &error) {
-    const auto status = static_cast<KNOB_ReturnStatus>(error.status);
-    Knob::rememberFailure(status, error.what());
-    return status;
+    return failed(static_cast<KNOB_ReturnStatus>(error.status), error.what());
   } catch (const std::bad_alloc &) {
-    return KNOB_STATUS_OUT_OF_MEMORY;
+    return failed(KNOB_STATUS_OUT_OF_MEMORY, "");
   } catch (const std::exception &error) {
-    Knob::rememberFailure(KNOB_STATUS_FAILURE, error.what());
-    return KNOB_STATUS_FAILURE;
+    return failed(KNOB_STATUS_FAILURE, error.what());
   } catch (...) {
-    return KNOB_STATUS_FAILURE;
+    return failed(KNOB_STATUS_FAILURE, "");
   }
 }
 
 template <typename Value>
 void append(KNOB_ParamList *list, const Value &value) {
   if (list == nullptr || list->entries.size() >= list->capacity) {
-    throw Knob::KernelError(Status::kBadParameter, list == nullptr ? "no list" : "the list is full");
+    throw Knob::KernelError(Status::kBadParameter,
+                            list == nullptr ? "no list" : "the list is full");
   }
   list->entries.emplace_back(std::in_place_type<Value>, value);
 }
@@ -70,8 +73,8 @@ extern "C" {
 #pragma GCC visibility push(default)
 
 // A node that knob.h does not declare is an error here: its object would not be exported.
-#define KNOB_EXPORT_NODE(name, number, node)                                     \
-  static_assert(std::is_same_v<decltype(KNOB_NODE_##name), const KNOB_NodeID>);  \
+#define KNOB_EXPORT_NODE(name, number, node)                                    \
+  static_assert(std::is_same_v<decltype(KNOB_NODE_##name), const KNOB_NodeID>); \
   const KNOB_NodeID KNOB_NODE_##name = number;
 KNOB_NODE_LIST(KNOB_EXPORT_NODE)
 #undef KNOB_EXPORT_NODE
@@ -83,7 +86,7 @@ int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
     own = Knob::buildSignature();
     running = LiveKernel::instance().with([](Kernel &kernel) { return kernel.signature(); });
   });
-  Knob::forgetFailure();  // the result is not a status
+  Knob::forgetFailure();  // the result is not a status that has a text
   if (status != 0 || Knob::sameInterface(running, own)) return 0;
 
   if (runningBuild != nullptr && size > 0) {
@@ -94,12 +97,16 @@ int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
 }
 
 KNOB_ParamList *KNOB_ParamListCreate(int kind, int capacity) {
-  Knob::forgetFailure();  // a caller reports a null list as a status of its own choice
   const bool known = kind == static_cast<int>(Knob::ListKind::kInput) ||
                      kind == static_cast<int>(Knob::ListKind::kInstance);
-  if (!known || capacity < 0) return nullptr;
-  return new (std::nothrow)
-      KNOB_ParamList{static_cast<Knob::ListKind>(kind), static_cast<size_t>(capacity), {}};
+  KNOB_ParamList *list = nullptr;
+  if (known && capacity >= 0) {
+    list = new (std::nothrow)
+        KNOB_ParamList{static_cast<Knob::ListKind>(kind), static_cast<size_t>(capacity), {}};
+  }
+  // The caller reports a null list as a status of its own choice, which has no reason.
+  if (list == nullptr) Knob::forgetFailure();
+  return list;
 }
 
 KNOB_ReturnStatus KNOB_ParamListAddInt(KNOB_ParamList *list, int64_t value) {
@@ -113,7 +120,6 @@ KNOB_ReturnStatus KNOB_ParamListAddString(KNOB_ParamList *list, const char *text
   });
 }
 
-// Keeps the reason of the last failure: programs destroy their lists before they ask for its text.
 void KNOB_ParamListDestroy(KNOB_ParamList *list) {
   delete list;
 }

@@ -55,9 +55,10 @@ void rememberFailure(uint32_t status, std::string_view reason) noexcept {
 }
 
 const char *explainedStatusText(uint32_t status) noexcept {
-  const char *text = statusText(status);
-  if (last.reason[0] == '\0' || last.status != status) return text;
-  (void)std::snprintf(last.text.data(), last.text.size(), "%s: %s", text, last.reason.data());
+  if (last.reason[0] == '\0' || last.status != status) return statusText(status);
+  const std::string_view name = statusName(status);
+  (void)std::snprintf(last.text.data(), last.text.size(), "%.*s: %s", static_cast<int>(name.size()),
+                      name.data(), last.reason.data());
   return last.text.data();
 }
 

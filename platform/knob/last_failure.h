@@ -7,16 +7,17 @@
 
 namespace Knob {
 
-// Forgets the reason of an earlier call. Every call that can fail does this first, so that a later
-// failure with the same status is never explained by an old reason.
-void forgetFailure() noexcept;
-
 // Keeps the reason for the calling thread: one line, control characters escaped, cut to a bounded
-// length. Without memory the reason is lost and the status's own text is used.
+// length. Every failing call does this, so that a failure is never explained by the reason of an
+// earlier one with the same status. A call that succeeds keeps the reason: a program may undo its
+// work before it asks for the text. Without memory the reason is lost.
 void rememberFailure(uint32_t status, std::string_view reason) noexcept;
 
-// The text of a status: "TEXT", or "TEXT: REASON" for the status of the thread's last failed call.
-// Valid until the calling thread asks for another text or makes another call.
+// For a failure that has no status of this library.
+void forgetFailure() noexcept;
+
+// The text of a status, or "NAME: REASON" for the status of the thread's last failed call.
+// Valid until the calling thread asks for another text or makes another call that fails.
 const char *explainedStatusText(uint32_t status) noexcept;
 
 }  // namespace Knob

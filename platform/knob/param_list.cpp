@@ -18,7 +18,8 @@ const KNOB_ParamList &listOf(const KNOB_ParamList *list, ListKind kind) {
 }
 
 void requireNothing(const KNOB_ParamList *list, ListKind kind) {
-  if (list != nullptr) check(listOf(list, kind).entries.empty(), "a list has entries where none are expected");
+  if (list != nullptr)
+    check(listOf(list, kind).entries.empty(), "a list has entries where none are expected");
 }
 
 const ListEntry &onlyEntry(const KNOB_ParamList *list, ListKind kind) {

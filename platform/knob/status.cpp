@@ -15,4 +15,9 @@ const char *statusText(uint32_t status) noexcept {
   return unknown.data();
 }
 
+std::string_view statusName(uint32_t status) noexcept {
+  const std::string_view text = statusText(status);
+  return text.substr(0, text.find(": "));
+}
+
 }  // namespace Knob

@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cstdint>
+#include <string_view>
 
 #include "platform/knob_status.h"
 
@@ -26,6 +27,7 @@ enum class Status : uint32_t {
   kKernelNotUsable = KNOB_STATUS_KERNEL_NOT_USABLE,
 };
 
+// The part behind ": " is the usual reason; where the reason of a failure is known, it replaces it.
 struct StatusText {
   Status status;
   const char *text;
@@ -53,5 +55,8 @@ inline constexpr std::array kStatusTexts = {
 // The text of a status. For a status that is not in the table, a text with its number, valid until
 // the calling thread asks for another.
 const char *statusText(uint32_t status) noexcept;
+
+// The text without the usual reason: "busy". Valid as long as the text.
+std::string_view statusName(uint32_t status) noexcept;
 
 }  // namespace Knob

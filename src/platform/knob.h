@@ -52,8 +52,8 @@ KNOB_ReturnStatus KNOB_Get(KNOB_NodeID node, const KNOB_ParamList *instance, voi
                            size_t outputSize);
 
 /* Sets NODE. instance: the list [group id], or null where the node has no instance. input: the
-   arguments, or null where it takes none. output: receives the node's result, or null and 0. Returns
-   0 or a status; a change is made whole or not at all. */
+   arguments, or null where it takes none. output: receives the node's result, or null and 0.
+   Returns 0 or a status; a change is made whole or not at all. */
 KNOB_ReturnStatus KNOB_Set(KNOB_NodeID node, const KNOB_ParamList *instance,
                            const KNOB_ParamList *input, void *output, size_t outputSize);
 
@@ -63,9 +63,8 @@ KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamLi
                                             KNOB_ParamList **result);
 
 /* A text for a status, in one line. For the status of the calling thread's last failed call the
-   reason follows, as in "not found: host/opt/no", until the thread makes another call (destroying
-   a list does not count). An unknown status has a text with its number. The text is valid until
-   the thread asks for another one or makes another call. */
+   reason follows, as in "not found: host/opt/no". An unknown status has a text with its number.
+   The text is valid until the thread asks for another one or makes another call. */
 const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status);
 
 /* Facts of the machine (get, no instance). knob_records.h has the records. */

@@ -39,7 +39,7 @@ bool describeState(const Knob::Configuration &configuration, KernelReport *repor
   std::error_code unknown;  // opening the state reports what is wrong
   const bool missing = !std::filesystem::exists(path, unknown) && !unknown;
   report->lines.emplace_back("state",
-                                missing ? path + " (none yet; the first use makes it)" : path);
+                             missing ? path + " (none yet; the first use makes it)" : path);
   return !missing;
 }
 

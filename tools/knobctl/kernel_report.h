@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// What `knobctl status` prints: which kernel is configured, where it is, and whether it can be used.
+// What `knobctl status` prints: which kernel is configured, where it is, and whether it can be
+// used.
 #pragma once
 
 #include <string>

@@ -54,7 +54,7 @@ void writeBoot(Database &database, const BootRecord &record) {
   const HostFacts &facts = record.facts;
   // KB of 2^63 and more are kept as negative numbers and read back as what they were.
   Query(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
-      facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
+        facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
       .finish();
   if (!record.maxVms) return;
   Statement setMaxVms(database, "UPDATE kernel SET max_vms = ?");

@@ -100,7 +100,8 @@ GroupId EmulatedKernel::lookUp(std::string_view path) {
 }
 
 GroupId EmulatedKernel::create(GroupId parent, std::string_view name) {
-  if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "\"" + std::string(name) + "\" cannot name a group");
+  if (!isGroupName(name))
+    throw KernelError(Status::kBadParameter, "\"" + std::string(name) + "\" cannot name a group");
   return transact(Kind::kWrite, [&] {
     if (!store().exists(parent)) notFound(parent);
     if (store().child(parent, name)) throw KernelError(Status::kExists);
@@ -228,7 +229,7 @@ ResourceRow EmulatedKernel::require(GroupId id, Resource resource) {
 }
 
 void EmulatedKernel::reserve(GroupId id, Resource resource, const ResourceRow &row,
-                            const Allocation &wanted) {
+                             const Allocation &wanted) {
   std::vector<ResourceState> states = {row.state};
   std::vector<GroupId> ids = {id};
   std::vector<MemoryStatistics> peaks = {row.peaks};

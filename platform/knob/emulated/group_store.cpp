@@ -97,7 +97,7 @@ std::optional<ResourceRow> GroupStore::read(GroupId id, Resource resource) {
 
 void GroupStore::writeAllocation(GroupId id, Resource resource, const Allocation &allocation) {
   Query(of(resource).writeAllocation, allocation.min, allocation.max, allocation.minLimit,
-      allocation.shares, id)
+        allocation.shares, id)
       .finish();
 }
 
@@ -107,7 +107,7 @@ void GroupStore::writeChildrenSum(GroupId id, Resource resource, int64_t sum) {
 
 void GroupStore::writePeaks(GroupId id, const MemoryStatistics &peaks) {
   Query(writePeaks_, static_cast<int64_t>(peaks.ownReservedPeakKB),
-      static_cast<int64_t>(peaks.childrenReservedPeakKB), id)
+        static_cast<int64_t>(peaks.childrenReservedPeakKB), id)
       .finish();
 }
 

@@ -117,7 +117,8 @@ TEST_F(Knobctl, GroupsAreMadeAndDeleted) {
 
 TEST_F(Knobctl, WhatIsNotThereIsStatus3) {
   EXPECT_EQ(err(3, {"delete", "host/none"}), "knobctl: delete host/none: not found\n");
-  EXPECT_EQ(err(3, {"create", "host/none/a"}), "knobctl: create host/none/a: not found\n");
+  EXPECT_EQ(err(3, {"create", "host/none/a"}),
+            "knobctl: create host/none/a: not found: host/none\n");
   EXPECT_EQ(err(3, {"tree", "host/none"}), "knobctl: tree host/none: not found\n");
   EXPECT_EQ(err(3, {"tree", ""}), "knobctl: tree : not found\n");
   EXPECT_THAT(err(3, {"join", "host/opt", "4194305"}),

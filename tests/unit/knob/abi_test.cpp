@@ -199,10 +199,19 @@ TEST_F(Reasons, ABadSettingIsNamedWithItsValues) {
             "bad parameter: \"min=x\": not a decimal number of 64 bits");
 }
 
-TEST_F(Reasons, ALaterCallForgetsTheReason) {
+TEST_F(Reasons, AnUndoThatSucceedsKeepsTheReason) {
   const KNOB_ReturnStatus status = lookUp("host/opt/no");
   ASSERT_EQ(lookUp("host/opt"), 0U);
+  EXPECT_EQ(textOf(status), "not found: host/opt/no");
+}
+
+TEST_F(Reasons, ALaterFailureReplacesTheReason) {
+  const KNOB_ReturnStatus status = lookUp("host/opt/no");
+  EXPECT_EQ(setMemory({"max=-7"}), number(Status::kBadParameter));
   EXPECT_EQ(textOf(status), "not found");
+  KNOB_ParamList *list = KNOB_ParamListCreate(0, 0);
+  EXPECT_EQ(textOf(KNOB_ParamListAddInt(list, 1)), "bad parameter: the list is full");
+  KNOB_ParamListDestroy(list);
 }
 
 TEST_F(Reasons, AListThatIsNotMadeHasNoReasonOfAnEarlierCall) {
@@ -257,9 +266,7 @@ class Signature : public Abi {
         .execute((std::string("UPDATE kernel SET ") + change).c_str());
     ASSERT_TRUE(std::filesystem::remove(state_ + "-facts"));
   }
-  void bootByAnotherInterface() {
-    bootBy("md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
-  }
+  void bootByAnotherInterface() { bootBy("md5 = 'other', build_date = 'Jan  1 2001 01:02:03'"); }
 };
 
 TEST_F(Signature, TheSameBuildMatches) {

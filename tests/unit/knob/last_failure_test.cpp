@@ -23,6 +23,13 @@ TEST_F(LastFailure, TheReasonFollowsTheTextOfItsStatus) {
   EXPECT_STREQ(explainedStatusText(KNOB_STATUS_NOT_FOUND), "not found: host/opt/no");
 }
 
+TEST_F(LastFailure, AReasonReplacesTheUsualOne) {
+  EXPECT_STREQ(explainedStatusText(KNOB_STATUS_BUSY),
+               "busy: child groups or living processes in it");
+  rememberFailure(KNOB_STATUS_BUSY, "child groups are in it");
+  EXPECT_STREQ(explainedStatusText(KNOB_STATUS_BUSY), "busy: child groups are in it");
+}
+
 TEST_F(LastFailure, AnotherStatusHasNoReason) {
   rememberFailure(KNOB_STATUS_NOT_FOUND, "host/opt/no");
   EXPECT_STREQ(explainedStatusText(KNOB_STATUS_EXISTS), "already exists");

@@ -259,7 +259,8 @@ TEST_F(NodeTable, AllocationsFillTheirRecords) {
 TEST_F(NodeTable, AnOutputMayBeAtAnyAddress) {
   kernel_.statistics = {123, 456};
   const KNOB_ParamList instance = group();
-  getNode(kernel_, NodeIds::sched_groups_stats_memoryStats, &instance, output_.data() + 1, sizeof(KNOB_MemoryStats));
+  getNode(kernel_, NodeIds::sched_groups_stats_memoryStats, &instance, output_.data() + 1,
+          sizeof(KNOB_MemoryStats));
   const auto stats = at<KNOB_MemoryStats>(output_, 1);
   EXPECT_EQ(stats.ownReservedPeakKB, 123U);
   EXPECT_EQ(stats.childrenReservedPeakKB, 456U);
@@ -279,7 +280,8 @@ TEST_F(NodeTable, ArgumentsReachTheKernel) {
   setNode(kernel_, NodeIds::sched_groups_memAllocationInMB, &instance, &settings, nullptr, 0);
   setNode(kernel_, NodeIds::sched_groups_cpuAllocationInPct, &instance, &settings, nullptr, 0);
   setNode(kernel_, NodeIds::sched_groups_members_worlds, &instance, &pid, nullptr, 0);
-  EXPECT_EQ(listNode(kernel_, NodeIds::sched_groups_members_groups, &instance), (std::vector<int64_t>{7, 8, 9}));
+  EXPECT_EQ(listNode(kernel_, NodeIds::sched_groups_members_groups, &instance),
+            (std::vector<int64_t>{7, 8, 9}));
   EXPECT_EQ(kernel_.calls,
             (Calls{"lookUp host/opt", "create 9 pool", "remove 9", "set 9 memory min 3",
                    "set 9 cpu min 3", "join 9 77", "children 9"}));

@@ -69,7 +69,7 @@ TEST(Settings, ARefusalSaysWhichEntryAndWhy) {
     (void)parseAllocationChange(Resource::kMemory, {"min=5", "max=x"});
     FAIL();
   } catch (const KernelError &error) {
-    EXPECT_STREQ(error.what(), "\"max=x\": no decimal number");
+    EXPECT_STREQ(error.what(), "\"max=x\": not a decimal number of 64 bits");
   }
 }
 
