@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The least that any program on yaml-cpp does with a definition file: parse it, and look at the
-// text of every key and value once. What poolctl costs is compared with this.
+// The minimum that any program with yaml-cpp does with a definition file: parse it, and read the
+// text of every key and value once. The benchmark compares poolctl with it.
 #include <yaml-cpp/yaml.h>
 
 #include <cstddef>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// vfork semantics through posix_spawn, so that the size of the measuring process does not count.
+// posix_spawn uses vfork, so the size of the measuring process does not matter.
 #include "child_process.h"
 
 #include <fcntl.h>

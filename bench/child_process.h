@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Runs a program to its end and says what it cost.
+// Runs a program to its end and measures its time and memory.
 #pragma once
 
 #include <string>
@@ -13,8 +13,8 @@ struct Cost {
   double peakKB = 0;
 };
 
-// Output goes to /dev/null, errors to our own. Throws std::runtime_error when the program cannot be
-// started or does not end with status 0.
+// Its output goes to /dev/null, its errors to ours. Throws std::runtime_error when the program
+// cannot be started or does not end with status 0.
 Cost runProgram(const std::vector<std::string> &commandLine);
 
 }  // namespace Bench

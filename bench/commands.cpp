@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The commands on definition files of four sizes: list against a bare yaml-cpp program, load and
-// unload on the emulated kernel, and the start of the program. The two sides of a comparison take
-// turns within one run, so that a change in the machine's load meets both.
+// Measures the commands on definition files of four sizes: list against a bare yaml-cpp program,
+// load and unload on the emulated kernel, and the start of the program. The two sides of a
+// comparison alternate within one run, so that a change of the machine's load affects both.
 //
 // usage: bench_commands BIN_FOLDER BENCH_FOLDER WORK_FOLDER; scripts/run-bench calls it.
 #include <cstdio>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The same text for the same number of pools, on every machine.
+// The text depends only on the number of pools.
 #include "definitions.h"
 
 #include <fstream>

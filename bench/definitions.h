@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Definition files of any size, such as a program that manages a large host would write.
+// Definition files of any size, like those of a large host.
 #pragma once
 
 #include <cstddef>

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// One expression, read and evaluated from its text each time, by the language of the definitions
-// and by muParser, in turns.
+// Evaluates one expression, parsing its text each time, alternately by the language of the
+// definitions and by muParser.
 #include <muParser.h>
 
 #include <chrono>
@@ -17,7 +17,7 @@ constexpr int kRounds = 31;
 constexpr int kEvaluationsInRound = 20000;
 constexpr double kGoal = 15;
 
-// Keeps the compiler from dropping a loop whose result nobody reads.
+// Keeps the compiler from removing a loop whose result is not used.
 volatile double sink;
 
 template <typename Evaluation>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Medians and quartiles: on a busy machine the mean says more about its neighbours.
+// Medians and quartiles, because on a busy machine the mean depends on the other processes.
 #include "sample.h"
 
 #include <algorithm>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Repeated measurements of one thing, and how they are shown.
+// Repeated measurements of one quantity, and how they are printed.
 #pragma once
 
 #include <string>

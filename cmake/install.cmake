@@ -57,7 +57,7 @@ install(FILES ${CMAKE_SOURCE_DIR}/README.md ${CMAKE_SOURCE_DIR}/CHANGELOG.md
 install(FILES ${CMAKE_SOURCE_DIR}/docs/fleet.md
         DESTINATION ${CMAKE_INSTALL_DATADIR}/doc/poolctl/docs COMPONENT programs)
 
-# Only a package writes to /etc, where its manager looks after changes of the owner's.
+# Only a package installs files in /etc, since a package manager keeps the owner's changes there.
 install(FILES ${CMAKE_SOURCE_DIR}/packaging/knob.conf
         DESTINATION ${CMAKE_INSTALL_FULL_SYSCONFDIR} COMPONENT configuration EXCLUDE_FROM_ALL)
 install(DIRECTORY DESTINATION ${CMAKE_INSTALL_FULL_SYSCONFDIR}/rp.d

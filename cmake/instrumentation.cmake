@@ -8,6 +8,6 @@ if(POOLCTL_COVERAGE)
   add_link_options(--coverage)
 endif()
 if(POOLCTL_FUZZ)
-  # The fuzzer is led by what each input reaches.
+  # Lets the fuzzer see which code each input reaches.
   add_compile_options(-fsanitize=fuzzer-no-link)
 endif()

@@ -12,7 +12,7 @@ configuration store.")
 set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
 set(CPACK_DEBIAN_PACKAGE_SECTION admin)
 set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
-# What is loaded by name, and so not seen in the programs and libraries.
+# Loaded by name at run time, so dpkg-shlibdeps does not find it in the programs.
 set(CPACK_DEBIAN_PACKAGE_DEPENDS libsqlite3-0)
 set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
 set(CPACK_DEBIAN_PACKAGE_CONTROL_EXTRA ${CMAKE_SOURCE_DIR}/packaging/conffiles)

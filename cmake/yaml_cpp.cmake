@@ -12,8 +12,8 @@ else()
   target_link_libraries(yaml_cpp INTERFACE ${YAML_CPP_LIBRARIES})
 endif()
 
-# A copy outside the system's folders must be found at run time too: the package stands in
-# LIBRARIES/cmake/yaml-cpp.
+# A copy outside the system's folders must be found at run time too. Its CMake package is in
+# LIBRARIES/cmake/yaml-cpp, so the libraries are two folders up.
 set(yaml_cpp_rpath)
 if(NOT yaml-cpp_DIR MATCHES "^/usr/")
   get_filename_component(yaml_cpp_rpath ${yaml-cpp_DIR}/../.. ABSOLUTE)

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Sums saturate: a number beyond them is beyond every machine too, and is refused as such.
+// A group is checked as soon as its new sum is known, so a refusal changes nothing.
 #include "knob/admission.h"
 
 #include <algorithm>
@@ -8,7 +8,7 @@
 namespace Knob {
 namespace {
 
-constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
+constexpr int64_t kMaxSum = std::numeric_limits<int64_t>::max();
 
 bool withinOwnLimits(const ResourceState &state) {
   const int64_t reservation = reservationOf(state);
@@ -17,21 +17,26 @@ bool withinOwnLimits(const ResourceState &state) {
          (limits.minLimit == -1 || reservation <= limits.minLimit);
 }
 
-// The sum after one child's part of it went from before to after; before is part of the sum.
-int64_t replaced(int64_t sum, int64_t before, int64_t after) {
-  const int64_t others = sum - before;
-  return after > kMax - others ? kMax : others + after;
-}
-
 }  // namespace
 
 int64_t reservationOf(const ResourceState &state) {
   return std::max(state.allocation.min, state.childrenSum);
 }
 
+int64_t changedSum(int64_t sum, int64_t before, int64_t after) {
+  const int64_t others = std::max<int64_t>(sum - before, 0);
+  return after > kMaxSum - others ? kMaxSum : others + after;
+}
+
 int64_t machineCapacity(const HostFacts &facts, Resource resource) {
   if (resource == Resource::kCpu) return int64_t{100} * facts.cpus;
   return static_cast<int64_t>(facts.memoryKB / 1024);
+}
+
+void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted) {
+  if (wanted.max == 0 && state.childrenSum > 0) {
+    throw KernelError(Status::kBusy, "child groups have reservations");
+  }
 }
 
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
@@ -48,7 +53,7 @@ std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> state
     }
     ResourceState &state = states[above];
     const int64_t stateBefore = reservationOf(state);
-    state.childrenSum = replaced(state.childrenSum, before, after);
+    state.childrenSum = changedSum(state.childrenSum, before, after);
     before = stateBefore;
     after = reservationOf(state);
     if (after > before && !withinOwnLimits(state)) return std::nullopt;

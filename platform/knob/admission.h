@@ -20,8 +20,17 @@ struct ResourceState {
 
 int64_t reservationOf(const ResourceState &state);
 
+// The children's sum after the reservation of one child went from before to after. Saturates: a
+// larger number would exceed every machine too. A before that the sum cannot contain, which only
+// another program writes, counts as the whole sum.
+int64_t changedSum(int64_t sum, int64_t before, int64_t after);
+
 // How much can be reserved in all: MB of physical memory, or 100 percent for each CPU.
 int64_t machineCapacity(const HostFacts &facts, Resource resource);
+
+// Throws KernelError, busy, for a maximum of 0 while child groups have reservations. The caller
+// disables the group, and can wait until they are deleted; a refusal would be final.
+void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted);
 
 // states: of the group first, then of every group above it, up to the root. Returns the states
 // after the group has the wanted allocation, up to the last one that changes; nothing when the

@@ -13,16 +13,19 @@
 #include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <set>
 #include <stdexcept>
 #include <system_error>
 #include <thread>
 
+#include "common/unique_fd.h"
 #include "kestrel/etcd/http_client.h"
 #include "process.h"
 #include "temp_folder.h"
-#include "unique_fd.h"
 
 namespace Test {
+
+using Platform::UniqueFd;
 
 namespace fs = std::filesystem;
 
@@ -53,16 +56,22 @@ std::string ownAddress() {
 }
 
 std::string freePlace() {
-  const UniqueFd socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  // The kernel may give a port again that was bound and closed before.
+  static std::set<in_port_t> drawn;
+  const std::string host = ownAddress();
   sockaddr_in address{};
-  address.sin_family = AF_INET;
-  inet_pton(AF_INET, ownAddress().c_str(), &address.sin_addr);
-  socklen_t size = sizeof address;
-  auto *generic = reinterpret_cast<sockaddr *>(&address);
-  if (bind(socket.get(), generic, size) != 0 || getsockname(socket.get(), generic, &size) != 0) {
-    throw std::system_error(errno, std::generic_category(), "a free port");
-  }
-  return ownAddress() + ":" + std::to_string(ntohs(address.sin_port));
+  do {
+    const UniqueFd socket(::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    address = {};
+    address.sin_family = AF_INET;
+    inet_pton(AF_INET, host.c_str(), &address.sin_addr);
+    socklen_t size = sizeof address;
+    auto *generic = reinterpret_cast<sockaddr *>(&address);
+    if (bind(socket.get(), generic, size) != 0 || getsockname(socket.get(), generic, &size) != 0) {
+      throw std::system_error(errno, std::generic_category(), "a free port");
+    }
+  } while (!drawn.insert(address.sin_port).second);
+  return host + ":" + std::to_string(ntohs(address.sin_port));
 }
 
 EtcdMember::EtcdMember(std::string url, std::vector<std::string> commandLine, fs::path log)

@@ -17,7 +17,7 @@ namespace Test {
 // A loopback address that no other test process uses at the same time.
 std::string ownAddress();
 
-// "HOST:PORT" on that address, where nobody listens.
+// "HOST:PORT" on that address, where no process listens; another one at each call of a process.
 std::string freePlace();
 
 struct EtcdOptions {

@@ -9,9 +9,11 @@
 #include <thread>
 #include <vector>
 
-#include "unique_fd.h"
+#include "common/unique_fd.h"
 
 namespace Test {
+
+using Platform::UniqueFd;
 
 struct FakeRequest {
   std::string path, head, body;

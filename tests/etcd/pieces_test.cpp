@@ -5,6 +5,7 @@
 #include <sys/stat.h>
 
 #include <cmath>
+#include <set>
 
 #include "etcd_world.h"
 #include "kestrel/etcd/base64.h"
@@ -292,6 +293,14 @@ TEST_F(PasswordFile, MustBeAFileThatIsThere) {
   ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
   EXPECT_THAT(::Test::refusalOf([&] { (void)readPassword(path); }),
               HasSubstr("not a regular file"));
+}
+
+TEST(FreePlace, IsAnotherOneAtEachCall) {
+  // Of that many ports drawn at random from some 28,000, two are almost certainly the same.
+  constexpr size_t kCalls = 1000;
+  std::set<std::string> places;
+  for (size_t i = 0; i < kCalls; ++i) places.insert(::Test::freePlace());
+  EXPECT_EQ(places.size(), kCalls);
 }
 
 }  // namespace

@@ -173,5 +173,17 @@ TEST_F(BothAllocations, MemoryAndCpuAreApart) {
   EXPECT_EQ(cpu(group).value, (Settings{0, 50, -1, -3}));
 }
 
+using FixedGroups = ContractTest;
+
+TEST_F(FixedGroups, CannotBeDisabled) {
+  for (const char *path : {"host", "host/opt"}) {
+    const int64_t id = idOf(path);
+    EXPECT_EQ(setMemory(id, {"min=0", "max=0", "minLimit=0", "shares=0"}), kPermissionDenied);
+    EXPECT_EQ(memory(id).value, kNewGroup);
+    EXPECT_EQ(setMemory(id, {"max=1000"}), kSuccess);
+    EXPECT_EQ(setMemory(id, {"max=-1"}), kSuccess);
+  }
+}
+
 }  // namespace
 }  // namespace Contract

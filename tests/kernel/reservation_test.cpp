@@ -68,12 +68,23 @@ TEST_P(Reservation, ParentMaxRefusesTheSumOfItsChildren) {
 
 TEST_P(Reservation, ALimitBelowWhatTheChildrenReserveIsRefused) {
   ASSERT_EQ(setMin(first_, 15), kSuccess);
-  for (const Texts &settings : {Texts{"max=14"}, Texts{"minLimit=14"}, Texts{"min=0", "max=0"},
-                                Texts{"min=0", "max=0", "minLimit=0", "shares=0"}}) {
+  for (const Texts &settings : {Texts{"max=14"}, Texts{"minLimit=14"}}) {
     EXPECT_EQ(set(parent_, settings), kReservationRefused) << testing::PrintToString(settings);
   }
   EXPECT_EQ(get(parent_), kNewGroup);
   EXPECT_EQ(set(parent_, {"max=15", "minLimit=15"}), kSuccess);
+}
+
+// A command that waits for a busy group would report a refusal at once.
+TEST_P(Reservation, DisablingAGroupAboveReservationsIsBusy) {
+  ASSERT_EQ(setMin(first_, 15), kSuccess);
+  for (const Texts &settings :
+       {Texts{"min=0", "max=0"}, Texts{"min=0", "max=0", "minLimit=0", "shares=0"}}) {
+    EXPECT_EQ(set(parent_, settings), kBusy) << testing::PrintToString(settings);
+  }
+  EXPECT_EQ(get(parent_), kNewGroup);
+  ASSERT_EQ(setMin(first_, 0), kSuccess);
+  EXPECT_EQ(set(parent_, {"min=0", "max=0"}), kSuccess);
 }
 
 TEST_P(Reservation, AGroupFarAboveRefusesToo) {

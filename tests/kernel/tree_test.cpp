@@ -70,19 +70,21 @@ TEST_F(Tree, OneNameMayBeUsedUnderTwoParents) {
   EXPECT_NE(newGroup("host/opt/a", "same"), newGroup("host/opt/b", "same"));
 }
 
-TEST_F(Tree, BelowAGroupThatMayHaveNoMemoryNoneIsMade) {
+// So that a failed unload can rebuild pools below one that is disabled.
+TEST_F(Tree, BelowAMaximumOf0GroupsCanBeMadeWhileNothingLives) {
   const int64_t above = newGroup("host/opt", "above");
   const int64_t below = newGroup("host/opt/above", "below");
   ASSERT_EQ(setMemory(above, {"max=0"}), kSuccess);
   for (const int64_t parent : {above, below}) {
     const auto made = create(parent, "pool");
-    EXPECT_EQ(made.status, kOutOfMemory);
-    EXPECT_EQ(made.value, -1) << "the output is untouched";
+    ASSERT_EQ(made.status, kSuccess);
+    EXPECT_EQ(setMemory(made.value, {"max=100", "shares=500"}), kSuccess);
+    EXPECT_EQ(setCpu(made.value, {"max=50"}), kSuccess);
+    EXPECT_EQ(setMemory(made.value, {"min=1"}), kReservationRefused) << "0 leaves no room";
+    EXPECT_EQ(memory(above).value.max, 0);
   }
-  EXPECT_EQ(create(above, "below").status, kExists) << "what is there is told first";
+  EXPECT_EQ(create(above, "below").status, kExists);
   EXPECT_EQ(create(above, "..").status, kBadParameter);
-  ASSERT_EQ(setMemory(above, {"max=1000"}), kSuccess);
-  EXPECT_EQ(create(below, "pool").status, kSuccess);
 }
 
 TEST_F(Tree, ASecondGroupOfOneNameIsRefusedAndTheFirstStays) {

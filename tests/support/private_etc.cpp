@@ -25,7 +25,7 @@ fs::path realView(const fs::path &folder) {
   return folder.string() + ".real";
 }
 
-bool writeFile(const char *path, const char *text) {
+bool writeToProc(const char *path, const char *text) {
   const int file = open(path, O_WRONLY | O_CLOEXEC);
   if (file < 0) return false;
   const bool done = write(file, text, strlen(text)) == static_cast<ssize_t>(strlen(text));
@@ -33,19 +33,19 @@ bool writeFile(const char *path, const char *text) {
   return done;
 }
 
-// A mount namespace of one's own: root's right, or anybody's within a user namespace. User and
-// group keep their numbers there, so that the program does not take itself for root.
+// Root may create a mount namespace; other users may within a user namespace. User and group keep
+// their numbers there, so that the program does not think that it runs as root.
 const char *enterNamespace() {
   const uid_t user = geteuid();
   const gid_t group = getegid();
   if (user == 0 && unshare(CLONE_NEWNS) == 0) return nullptr;
   if (unshare(CLONE_NEWUSER | CLONE_NEWNS) != 0) return "unshare";
   char map[64];
-  if (!writeFile("/proc/self/setgroups", "deny")) return "setgroups";
+  if (!writeToProc("/proc/self/setgroups", "deny")) return "setgroups";
   snprintf(map, sizeof map, "%u %u 1", user, user);
-  if (!writeFile("/proc/self/uid_map", map)) return "uid_map";
+  if (!writeToProc("/proc/self/uid_map", map)) return "uid_map";
   snprintf(map, sizeof map, "%u %u 1", group, group);
-  if (!writeFile("/proc/self/gid_map", map)) return "gid_map";
+  if (!writeToProc("/proc/self/gid_map", map)) return "gid_map";
   return nullptr;
 }
 
@@ -86,7 +86,7 @@ void makePrivateEtc(const fs::path &folder) {
 }
 
 void removePrivateEtc(const fs::path &folder) {
-  // Never with content: were the machine's /etc still visible there, it would be deleted.
+  // rmdir and not remove_all: if the machine's /etc were still mounted there, it would be deleted.
   if (rmdir(realView(folder).c_str()) != 0 && errno != ENOENT)
     throw std::system_error(errno, std::generic_category(), realView(folder));
 }

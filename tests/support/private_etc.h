@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Another /etc for one program: everything that the machine has there, but rp.d and the
-// configuration files of the two platform libraries are the test's own. It exists in that
-// program's mount namespace alone; nothing of the machine is changed.
+// Gives one program an /etc of its own: the machine's files, except that rp.d and the configuration
+// files of the two platform libraries are the test's. It exists only in that program's mount
+// namespace; the machine is not changed.
 #pragma once
 
 #include <filesystem>
@@ -9,20 +9,18 @@
 
 namespace Test {
 
-// Why no program can be given an /etc of its own here; empty where that works. Asked once.
+// Why this machine cannot give a program its own /etc; empty where it can. Tried once.
 const std::string &privateEtcUnavailable();
 
-// Makes the folder FOLDER, filled with links into a second view of the real /etc, which will be
-// mounted beside it. The test puts its own rp.d, knob.conf and kestrel.conf in it, or leaves them
-// out.
+// Creates FOLDER and fills it with links into a second view of the real /etc, which is mounted
+// later at FOLDER.real. The test adds its own rp.d, knob.conf and kestrel.conf where it needs them.
 void makePrivateEtc(const std::filesystem::path &folder);
 
-// Removes what makePrivateEtc made outside FOLDER itself. Must come before FOLDER's parent is
-// removed with all its content.
+// Removes what makePrivateEtc created outside FOLDER. Call it before FOLDER's parent is removed.
 void removePrivateEtc(const std::filesystem::path &folder);
 
-// Called between fork and exec: makes FOLDER the /etc of this process. Null when that worked,
-// otherwise the step that failed, with errno set.
+// Makes FOLDER the /etc of this process. For use between fork and exec. Returns null, or the name
+// of the step that failed, with errno set.
 const char *enterPrivateEtc(const std::filesystem::path &folder);
 
 }  // namespace Test

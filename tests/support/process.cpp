@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The program's streams are anonymous files and no pipes: it can never wait for its reader, and a
-// child that it leaves behind can't keep the reader waiting.
+// The program's streams are anonymous files instead of pipes: it never waits for its reader, and a
+// child that it leaves behind does not keep the reader waiting.
 #include "process.h"
 
 #include <fcntl.h>
@@ -15,11 +15,13 @@
 #include <cstring>
 #include <system_error>
 
+#include "common/unique_fd.h"
 #include "private_etc.h"
-#include "unique_fd.h"
 
 namespace Test {
 namespace {
+
+using Platform::UniqueFd;
 
 [[noreturn]] void fail(const std::string &what) {
   throw std::system_error(errno, std::generic_category(), what);
@@ -54,7 +56,7 @@ std::vector<char *> pointers(std::vector<std::string> &texts) {
   return result;
 }
 
-// Everything between fork and exec that may fail; the child then says so with status 127.
+// The steps between fork and exec that can fail. Returns the name of the step that did, or null.
 const char *prepareChild(const Command &command, int in, int out, int err) {
   if (setpgid(0, 0) != 0) return "setpgid";
   if (!command.etc.empty()) {
@@ -106,7 +108,7 @@ ProcessResult run(const Command &command) {
     dprintf(err.get(), "starting %s: %s: %s\n", command.program.c_str(), step, strerror(errno));
     _exit(127);
   }
-  setpgid(pid, pid);  // whoever of the two comes first
+  setpgid(pid, pid);  // parent and child both do it, so that it is done before either continues
 
   ProcessResult result;
   result.timedOut = !endsWithin(pid, command.limit);

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Runs one program to its end and keeps what it wrote, byte for byte, and how it ended. Where
-// wanted, the program sees another /etc than this machine's (private_etc.h).
+// Runs one program to its end and returns its output, byte for byte, and how it ended. The program
+// can have an /etc of its own (private_etc.h).
 #pragma once
 
 #include <chrono>
@@ -18,13 +18,13 @@ enum class Streams {
 };
 
 struct Command {
-  std::filesystem::path program;                   // a path; nothing is searched
+  std::filesystem::path program;                   // a path; PATH is not searched
   std::vector<std::string> arguments;              // without the program's own name
-  std::map<std::string, std::string> environment;  // the whole of it
+  std::map<std::string, std::string> environment;  // nothing is inherited
   std::string input;
   std::filesystem::path workingFolder = "/";
-  // The folder that stands in place of /etc for the program, as made by makePrivateEtc();
-  // empty: the machine's own.
+  // The folder that the program sees as /etc, created by makePrivateEtc(); empty: the machine's
+  // /etc.
   std::filesystem::path etc;
   Streams streams = Streams::kApart;
   std::chrono::seconds limit{120};
@@ -34,7 +34,7 @@ struct ProcessResult {
   std::string out, err;
   int status = -1;        // the exit status; -1: ended by a signal
   int signal = 0;         // the signal that ended it; 0: none
-  bool timedOut = false;  // it was still running at the limit, and was killed with its children
+  bool timedOut = false;  // killed at the limit, with its children
 };
 
 // Throws std::system_error when the program can't be started.

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// A world in which the program under test meets the stand-in libraries: what they answer, and what
-// they saw. The script lines and the traces are described in recording/README.md.
+// A world in which the program under test uses the stand-in libraries. A test writes their scripts
+// and reads their traces; recording/README.md describes both.
 #pragma once
 
 #include <string>
@@ -18,11 +18,11 @@ class StandInWorld : public World {
   // Adds a line to the script of the recording libknob.
   void knob(const std::string &line);
 
-  // Puts the scripted libkestrelconfig in the place of the real one, and adds a line to its script.
+  // Replaces the real libkestrelconfig by the scripted one, and adds a line to its script.
   void config(const std::string &line);
 
-  // Gives the program a clock that stands still at that second but for what it sleeps, and keeps
-  // what it logs.
+  // Gives the program a clock that starts at that second and advances only when it sleeps, and
+  // records what it logs.
   void hostCalls(const std::string &startSecond = "1000000000");
 
   // Runs poolctl with empty traces.
@@ -30,16 +30,16 @@ class StandInWorld : public World {
 
   bool ranPoolctl() const;
 
-  // What the last run left.
-  std::vector<std::string> everyCall() const;    // but those for texts of statuses
+  // The traces of the last run.
+  std::vector<std::string> everyCall() const;    // except those for texts of statuses
   std::vector<std::string> kernelCalls() const;  // KNOB_Get, KNOB_Set, KNOB_GetInstanceListAlloc
-  std::vector<std::string> groupCalls() const;   // the same without the facts of the machine
-  std::vector<std::string> misuse() const;       // faults in the use of lists, or a missing end
+  std::vector<std::string> groupCalls() const;   // the same, without those for facts of the machine
+  std::vector<std::string> misuse() const;       // wrong use of lists, or a missing END
   std::vector<std::string> hostTrace() const;    // log and sleep, of the host calls
   std::vector<std::string> flushes() const;      // of standard output
   std::vector<std::string> configTrace() const;
-  std::string groups() const;  // as they are at the end, one a line
-  bool wasInjected() const;    // a rule made a call fail
+  std::string groups() const;  // at the end of the program, one on each line
+  bool wasInjected() const;    // whether a rule made a call fail
 
  private:
   void addLine(const char *variable, const std::string &line);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The harness itself: a test that leans on it must be able to fail.
+// Tests of the test helpers: a test that uses them must be able to fail.
 #include <gtest/gtest.h>
 
 #include <csignal>
@@ -24,7 +24,7 @@ TEST(Process, KeepsBothStreamsAsBytesAndTheStatus) {
   EXPECT_EQ(result.status, 7);
 }
 
-TEST(Process, TellsASignalFromAnExit) {
+TEST(Process, DistinguishesASignalFromAnExit) {
   const World world;
   const ProcessResult result = shell(world, "kill -TERM $$");
   EXPECT_EQ(result.signal, SIGTERM);
@@ -42,13 +42,13 @@ TEST(Process, IsKilledWithItsChildrenAtTheLimit) {
   EXPECT_EQ(result.signal, SIGKILL);
 }
 
-TEST(Process, PassesItsInputOn) {
+TEST(Process, GetsItsInput) {
   World world;
   world.input = "from the test";
   EXPECT_EQ(shell(world, "cat").out, "from the test");
 }
 
-TEST(PrivateEtc, ShowsTheTestsOwnRpDAndTheRestOfTheMachines) {
+TEST(PrivateEtc, HasTheTestsRpDAndTheMachinesOtherFiles) {
   SKIP_WITHOUT_PRIVATE_ETC();
   World world;
   world.definition("a.yaml", "content");
@@ -65,15 +65,15 @@ TEST(PrivateEtc, LeavesTheMachinesOwnEtcAlone) {
   EXPECT_FALSE(std::filesystem::exists("/etc/only-in-the-test"));
 }
 
-TEST(HostCalls, ASleepTakesNoTimeButMovesTheClock) {
+TEST(HostCalls, SleepTakesNoTimeButMovesTheClock) {
   StandInWorld world;
   world.hostCalls("100");
-  // Longer than the harness would wait.
+  // Longer than run() waits for a program.
   EXPECT_EQ(shell(world, "/bin/sleep 1000").status, 0);
   EXPECT_EQ(world.hostTrace(), std::vector<std::string>{"sleep 1000000000"});
 }
 
-// Calls the recording libknob in this very process.
+// Calls the recording libknob in the process of the test.
 class RecordingKnob : public testing::Test {
  protected:
   RecordingKnob() {
@@ -91,7 +91,7 @@ TEST_F(RecordingKnob, ReportsAListThatIsNeverDestroyed) {
   EXPECT_EQ(world.misuse(), std::vector<std::string>{"MISUSE list #1 was never destroyed"});
 }
 
-TEST_F(RecordingKnob, ReportsASecondDestroyAndAUseAfterIt) {
+TEST_F(RecordingKnob, ReportsASecondDestroyAndALaterUse) {
   KNOB_ParamList *list = KNOB_ParamListCreate(0, 1);
   KNOB_ParamListDestroy(list);
   KNOB_ParamListDestroy(list);
@@ -112,7 +112,7 @@ TEST_F(RecordingKnob, FailsTheCallsThatARuleNames) {
   EXPECT_TRUE(world.wasInjected());
 }
 
-TEST_F(RecordingKnob, AnswersFromTheScriptedGroups) {
+TEST_F(RecordingKnob, ReturnsTheScriptedGroups) {
   world.knob("group host/opt/a min=5 max=6");
   KNOB_ParamList *list = KNOB_ParamListCreate(1, 1);
   KNOB_ParamListAddInt(list, 11);

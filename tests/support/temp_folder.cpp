@@ -22,7 +22,7 @@ TempFolder::TempFolder() {
 }
 
 TempFolder::~TempFolder() {
-  std::error_code ignored;  // what is left over harms nobody
+  std::error_code ignored;  // left-over files do no harm
   fs::remove_all(path_, ignored);
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A folder of the test's own, gone when the test ends; and the marks and texts of files in it.
+// A temporary folder, removed when the test ends, and helpers for the files in it.
 #pragma once
 
 #include <filesystem>
@@ -10,7 +10,7 @@ namespace Test {
 
 class TempFolder {
  public:
-  // Made in TMPDIR, or in /tmp.
+  // Created in TMPDIR, or in /tmp.
   TempFolder();
   TempFolder(const TempFolder &) = delete;
   TempFolder &operator=(const TempFolder &) = delete;
@@ -24,11 +24,11 @@ class TempFolder {
 
 void writeFile(const std::filesystem::path &path, std::string_view content);
 
-// The file's content; empty when there is no such file.
+// The file's content; empty when the file cannot be read.
 std::string readFile(const std::filesystem::path &path);
 
-// Sets the attribute by which a definition file counts as installed, under the name that the file
-// system takes. Throws std::system_error when it takes neither.
+// Sets the attribute that marks a definition file as installed, under the name that the file system
+// supports. Throws std::system_error when it supports neither.
 void setInstalledMark(const std::filesystem::path &path, std::string_view value = "\x01");
 
 }  // namespace Test

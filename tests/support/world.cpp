@@ -10,13 +10,13 @@ namespace fs = std::filesystem;
 
 namespace {
 
-// What the build itself needs of the tests' environment: sanitizers, coverage, and a yaml library
-// that stands elsewhere.
-void passOn(std::map<std::string, std::string> *environment) {
+// Adds the variables of the tests' own environment that the built programs need: for sanitizers,
+// coverage, and a yaml library outside the system's folders.
+void inheritBuildVariables(std::map<std::string, std::string> *environment) {
   for (const char *name : {"ASAN_OPTIONS", "UBSAN_OPTIONS", "LSAN_OPTIONS", "TSAN_OPTIONS",
                            "GCOV_PREFIX", "GCOV_PREFIX_STRIP", "LD_LIBRARY_PATH"})
     if (const char *value = getenv(name)) (*environment)[name] = value;
-  // A preloaded stand-in may come before the sanitizer's runtime.
+  // Lets a preloaded stand-in come before the sanitizer's runtime.
   std::string &asan = (*environment)["ASAN_OPTIONS"];
   asan += std::string(asan.empty() ? "" : ":") + "verify_asan_link_order=0";
 }
@@ -42,7 +42,7 @@ World::World() {
                  {"XDG_DATA_HOME", own},
                  {"KNOB_CONF", own + "/knob.conf"},
                  {"KESTREL_CONF", own + "/kestrel.conf"}};
-  passOn(&environment);
+  inheritBuildVariables(&environment);
   writeFile(folder() / "knob.conf", "kernel = emulated\nstate = " + own + "/kernel.db\n");
   writeFile(folder() / "kestrel.conf", "store = sqlite\npath = " + own + "/store.db\n");
 }

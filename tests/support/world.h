@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The world of one test: a folder of its own, with definition files, configuration and kernel
-// state, and the programs run in it. Nothing of it is shared with another test.
+// The surroundings of one test: a temporary folder with definition files, configuration and kernel
+// state, in which it runs programs. Tests share none of it.
 #pragma once
 
 #include <filesystem>

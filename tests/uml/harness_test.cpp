@@ -165,6 +165,22 @@ TEST_F(Machine, AKernelThatEndsBeforeItsFirstProcessIsNoMachine) {
   EXPECT_THAT(result.err, HasSubstr("no ptrace here"));
 }
 
+TEST_F(Machine, OneWhoseFirstProcessRanIsBrokenAndNotSkipped) {
+  SKIP_WITHOUT_MACHINE(inMachine("true"));
+  fs::create_directory(world.folder() / "bin");
+  const fs::path mount = world.folder() / "bin" / "mount";
+  ::Test::writeFile(mount,
+                    "#!/bin/sh\n"
+                    "case $* in *hostfs*) exec /usr/bin/mount -r \"$@\" ;; esac\n"
+                    "exec /usr/bin/mount \"$@\"\n");
+  fs::permissions(mount, fs::perms::owner_all);
+  world.environment["PATH"] = (world.folder() / "bin").string() + ":" + world.environment["PATH"];
+  const auto result = run({"--", "true"});
+  EXPECT_EQ(result.status, 125);
+  EXPECT_THAT(result.out, Not(HasSubstr("SKIPPED")));
+  EXPECT_THAT(result.err, HasSubstr("the machine broke"));
+}
+
 TEST_F(Machine, WrongUsageEndsWith125) {
   for (const ::Test::Arguments &arguments :
        {::Test::Arguments{}, ::Test::Arguments{"--"}, ::Test::Arguments{"--mem=lots", "true"},

@@ -3,6 +3,9 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <chrono>
+#include <future>
+
 #include "expected_files.h"
 #include "linux_world.h"
 
@@ -175,6 +178,36 @@ TEST_F(Poolctl, WhatStandsBesideHostIsNeverTouched) {
   ASSERT_TRUE(silentlyDone(world.poolctl({"unload", (world.folder() / "pools.yaml").string()})));
   EXPECT_EQ(actualFiles("system.slice"), before);
   EXPECT_EQ(readControl("system.slice", "cgroup.subtree_control"), "");
+}
+
+TEST_F(Poolctl, AFailedUnloadRebuildsPoolsBelowADisabledOne) {
+  ASSERT_TRUE(silentlyDone(load("- name: a\n- name: a/b\n- name: a/c\n  memMax: 64\n")));
+  ASSERT_TRUE(silentlyDone(world.poolctl({"disable", "-n", "host/opt/a"})));
+  std::filesystem::create_directory(kMount / "host/opt/a/b/foreign");
+  const std::string file = (world.folder() / "pools.yaml").string();
+  EXPECT_EQ(world.poolctl({"unload", file}).status, 1);
+  EXPECT_EQ(numberIn("host/opt/a", "memory.max"), 0);
+  EXPECT_EQ(numberIn("host/opt/a/c", "memory.max"), 64 * kMiB);
+  EXPECT_EQ(world.run("knobctl", {"check"}).status, 0);
+}
+
+TEST_F(Poolctl, DisableWaitsWhileAPoolBelowHasAReservation) {
+  ASSERT_TRUE(silentlyDone(load("- name: a\n- name: a/b\n  memMin: 16\n")));
+  auto command = std::async(std::launch::async, [&] {
+    return world.poolctl({"disable", "-w", "60", "host/opt/a"});
+  });
+  EXPECT_EQ(command.wait_for(std::chrono::seconds(2)), std::future_status::timeout);
+  EXPECT_TRUE(silentlyDone(world.poolctl({"disable", "host/opt/a/b"})));
+  EXPECT_TRUE(silentlyDone(command.get()));
+  EXPECT_EQ(allGroups(), kFixedGroups);
+}
+
+TEST_F(Poolctl, TheFixedGroupsCannotBeDisabled) {
+  for (const char *group : {"host", "host/opt"}) {
+    EXPECT_EQ(world.poolctl({"disable", group}).status, 1);
+    EXPECT_EQ(numberIn("host", "memory.max"), kMax);
+  }
+  EXPECT_TRUE(silentlyDone(load("- name: web\n")));
 }
 
 }  // namespace

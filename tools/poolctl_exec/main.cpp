@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// poolctl-exec: joins a pool, then becomes the command. Nothing of it stays between the command and
-// whoever started it: the process id, the streams, the signals and the exit status are the
-// command's own.
+// poolctl-exec: joins a pool, then executes the command in its own place. So the process id, the
+// streams, the signals and the exit status are the command's own.
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
@@ -14,15 +13,16 @@
 #include <string>
 
 #include "pool_membership.h"
+#include "shared/version.h"
 
 namespace {
 
-// As shells and env(1) have them.
+// The same as those of env(1) and of shells.
 constexpr int kOwnFailure = 125;
 constexpr int kNotExecutable = 126;
 constexpr int kNoCommand = 127;
 
-// The command is no argument of ours, so the library doesn't know that it belongs to the line.
+// The parser never sees the command, so its own usage line would not show it.
 struct UsageLine : CLI::Formatter {
   std::string make_usage(const CLI::App *, std::string) const override {
     return "Usage: poolctl-exec [OPTIONS] POOL -- COMMAND [ARGUMENT]...\n";
@@ -34,22 +34,23 @@ int complain(const std::string &text, int status) {
   return status;
 }
 
-// The place of the first "--", or argc. What stands behind it is never read as anything of ours.
+// The index of the first "--", or argc. What follows it is never parsed.
 int findSeparator(int argc, char **argv) {
   int at = 1;
   while (at < argc && strcmp(argv[at], "--") != 0) ++at;
   return at;
 }
 
-// Answers only when the command could not be become.
+// Returns only if the command was not executed.
 int run(int argc, char **argv) {
-  CLI::App app("Join a pool and become a command.", "poolctl-exec");
+  CLI::App app("Join a pool and execute a command in it.", "poolctl-exec");
   std::string pool;
   app.formatter(std::make_shared<UsageLine>());
+  app.set_version_flag("--version", Tools::versionOf("poolctl-exec"), "Print the version and exit");
   app.add_option("POOL", pool, "A loaded pool: host/..., or NAME for host/opt/NAME")->required();
   app.footer(
       "Exit status: the command's own; 125 the pool could not be joined, or wrong usage;\n"
-      "126 the command cannot be run; 127 there is no such command.");
+      "126 the command cannot be executed; 127 it was not found.");
 
   const int separator = findSeparator(argc, argv);
   try {
@@ -79,7 +80,7 @@ int main(int argc, char **argv) {
   try {
     return run(argc, argv);
   } catch (...) {
-    // Whatever goes wrong with the very frame: there may be no memory to say more.
+    // There may be no memory for a longer message.
     (void)std::fputs("poolctl-exec: out of memory\n", stderr);
     return kOwnFailure;
   }

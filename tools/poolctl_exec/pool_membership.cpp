@@ -43,12 +43,11 @@ int64_t memoryMaxMB(const std::string &path) {
   return allocation.max;
 }
 
-// Says which group it is that may have no memory, if there is one still.
+// Throws, naming the group that has no memory. Returns if it has been enabled meanwhile.
 void refuseDisabled(const std::string &path) {
   for (size_t end = path.find('/'); end != std::string::npos; end = path.find('/', end + 1)) {
     const std::string above = path.substr(0, end);
-    if (memoryMaxMB(above) == 0)
-      refuse(path, ("disabled: " + above + " may have no memory").c_str());
+    if (memoryMaxMB(above) == 0) refuse(path, ("disabled: " + above + " has no memory").c_str());
   }
   if (memoryMaxMB(path) == 0) refuse(path, "the pool is disabled");
 }
@@ -69,7 +68,7 @@ void joinGroup(const std::string &path) {
     status =
         KNOB_Set(KNOB_NODE_sched_groups_members_worlds, instance.get(), input.get(), nullptr, 0);
   }
-  if (status == KNOB_STATUS_NOT_FOUND) refuse(path, "the pool was unloaded in this moment");
+  if (status == KNOB_STATUS_NOT_FOUND) refuse(path, "the pool has just been unloaded");
   if (status == KNOB_STATUS_BUSY)
     refuse(path, "the pool has pools below it, so it takes no processes itself");
   if (status == KNOB_STATUS_OUT_OF_MEMORY) refuseDisabled(path);

@@ -6,14 +6,13 @@
 
 namespace Exec {
 
-// The path of the group that a pool's name stands for, by the rule of definition files: a name
-// that does not begin with "host/" stands below host/opt.
+// The path of a pool's group. As in definition files, a name that does not begin with "host/" is
+// below host/opt.
 std::string groupPath(const std::string &pool);
 
-// Moves the calling process, as it is, into the group of that path; what it starts later is in
-// there too. A pool that is disabled, itself or by one above it, is refused. Throws
-// std::runtime_error, whose what() names the group and the reason; the process then is where it
-// was.
+// Moves the calling process into the group of that path; its later child processes start there. A
+// pool that is disabled, or is below a disabled one, is refused. Throws std::runtime_error, whose
+// what() names the group and the reason; the process has then not moved.
 void joinGroup(const std::string &path);
 
 }  // namespace Exec

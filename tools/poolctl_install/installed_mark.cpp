@@ -15,9 +15,9 @@
 namespace Install {
 namespace {
 
-constexpr size_t kLongestMark = 65536;  // Linux's own limit for any attribute
+constexpr size_t kMaxMarkSize = 65536;  // Linux's limit for any attribute
 
-// The file system's magic number is all that is always known of it.
+// The magic number is the only name that every file system has.
 std::string fileSystemOf(int file) {
   struct statfs info {};
   if (fstatfs(file, &info) != 0) return "unknown";
@@ -42,7 +42,7 @@ const Mark kInstalled = std::string(1, '\1');
 
 Mark readMark(int file) {
   for (const char *const name : Loader::kInstalledMarks) {
-    std::string value(kLongestMark, '\0');
+    std::string value(kMaxMarkSize, '\0');
     const ssize_t size = fgetxattr(file, name, value.data(), value.size());
     if (size >= 0) return value.substr(0, static_cast<size_t>(size));
     if (errno != ENOTSUP) break;

@@ -7,14 +7,14 @@
 
 namespace Install {
 
-// Each throws a std::exception whose what() is for people and names the file. Everything that was
-// done is undone then; what cannot be undone is reported on standard error.
+// Each throws a std::exception whose what() is a message for users and names the file. Everything
+// that was done is undone then; what cannot be undone is reported on standard error. SIGINT,
+// SIGTERM and SIGHUP are held back meanwhile, and take effect between two files.
 
-// Copies each file into the definitions' folder under its own name, after the loader has accepted
-// it.
+// Copies each file into the definition folder under its own name, after the loader has accepted it.
 void installFiles(const std::vector<std::string> &paths);
 
-// Marks each file where it stands, after the loader has accepted it.
+// Marks each file where it is, after the loader has accepted it.
 void markFiles(const std::vector<std::string> &paths);
 
 // Removes the installed files of these names.

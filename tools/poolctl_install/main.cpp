@@ -12,35 +12,36 @@
 
 namespace {
 
-struct Words {
+struct Options {
   bool mark = false;
   bool remove = false;
   std::vector<std::string> operands;
 };
 
-Tools::ExitStatus act(const Words &words) {
-  if (words.mark) {
-    Install::markFiles(words.operands);
-  } else if (words.remove) {
-    Install::removeFiles(words.operands);
+Tools::ExitStatus act(const Options &options) {
+  if (options.mark) {
+    Install::markFiles(options.operands);
+  } else if (options.remove) {
+    Install::removeFiles(options.operands);
   } else {
-    Install::installFiles(words.operands);
+    Install::installFiles(options.operands);
   }
   return Tools::kExitSuccess;
 }
 
-void addWords(CLI::App &app, Tools::Action *action) {
-  const auto words = std::make_shared<Words>();
+void declareOptions(CLI::App &app, Tools::Action *action) {
+  const auto options = std::make_shared<Options>();
   CLI::Option *const mark = app.add_flag(
-      "--mark", words->mark, "Mark the files as installed where they stand; copy nothing");
-  app.add_flag("--remove", words->remove, "Remove the installed files of these names")
+      "--mark", options->mark, "Mark the files as installed where they are; copy nothing");
+  app.add_flag("--remove", options->remove, "Remove the installed files of these names")
       ->excludes(mark);
-  app.add_option("FILE", words->operands, "Definition files; with --remove, names in /etc/rp.d")
+  app.add_option("FILE", options->operands, "Definition files; with --remove, names in /etc/rp.d")
       ->required();
   app.footer(
-      "Exit status: 0 done; 1 refused or failed; 2 wrong usage; 3 no such file.\n"
+      "Exit status: 0 done; 1 refused or failed; 2 wrong usage; 3 no such file;\n"
+      "4 another run of poolctl-install is in the way.\n"
       "Nothing has changed unless it is 0.\n");
-  *action = [words] { return act(*words); };
+  *action = [options] { return act(*options); };
 }
 
 }  // namespace
@@ -48,6 +49,7 @@ void addWords(CLI::App &app, Tools::Action *action) {
 int main(int argc, char **argv) {
   return Tools::runTool(
       {"poolctl-install",
-       "Install pool definition files in /etc/rp.d, all that are named or none of them.", addWords},
+       "Install pool definition files in /etc/rp.d, all that are named or none of them.",
+       declareOptions},
       argc, argv);
 }

@@ -9,29 +9,29 @@
 
 namespace Tools {
 
-// WORDS holds what a line says, for all the tool's sub-commands.
-template <typename Words>
+// OPTIONS holds the options and operands of all the tool's sub-commands.
+template <typename Options>
 struct Command {
   const char *name;
   const char *help;
-  void (*declare)(CLI::App &command, Words *words);  // the words that it takes
-  ExitStatus (*run)(const Words &words);
+  void (*declare)(CLI::App &command, Options *options);
+  ExitStatus (*run)(const Options &options);
 };
 
 // Adds every row of TABLE to APP. Parsing one sets *ACTION, which must live as long as APP.
 template <typename Table>
 void addCommands(CLI::App &app, const Table &table, Action *action) {
-  app.require_subcommand(0, 1);  // none at all is runTool()'s own usage error
+  app.require_subcommand(0, 1);  // runTool() reports a missing one
   for (const auto &row : table) addCommand(app, row, action);
 }
 
-template <typename Words>
-void addCommand(CLI::App &app, const Command<Words> &row, Action *action) {
+template <typename Options>
+void addCommand(CLI::App &app, const Command<Options> &row, Action *action) {
   CLI::App *command = app.add_subcommand(row.name, row.help);
-  const auto words = std::make_shared<Words>();
-  row.declare(*command, words.get());
+  const auto options = std::make_shared<Options>();
+  row.declare(*command, options.get());
   const auto run = row.run;
-  command->callback([=] { *action = [=] { return run(*words); }; });
+  command->callback([=] { *action = [=] { return run(*options); }; });
 }
 
 }  // namespace Tools

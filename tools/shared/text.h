@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Texts from outside on a terminal or in a script's hands: nothing in them may end a line, move a
-// cursor or break a table.
+// Prints texts from outside for terminals and scripts, so that nothing in them ends a line, moves
+// the cursor or breaks a table.
 #pragma once
 
 #include <cstddef>
@@ -17,7 +17,7 @@ using Platform::printable;
 // East Asia and for emoji, none for combining marks.
 size_t displayWidth(std::string_view text);
 
-// The text filled up with blanks to that many columns.
+// The text with blanks added up to that many columns.
 std::string padded(const std::string &text, size_t columns);
 
 }  // namespace Tools

@@ -1,5 +1,4 @@
 // SPDX-License-Identifier: Apache-2.0
-// Nothing here knows what a tool does.
 #include "shared/tool.h"
 
 #include <CLI/App.hpp>
@@ -8,6 +7,8 @@
 #include <cstdio>
 #include <exception>
 #include <iostream>
+
+#include "shared/version.h"
 
 namespace Tools {
 
@@ -18,8 +19,8 @@ ExitStatus complain(const CLI::App &app, ExitStatus status, const char *message)
   return status;
 }
 
-// Help is an exception of the parser too, with exit code 0.
-ExitStatus answerParseError(const CLI::App &app, const CLI::ParseError &error) {
+// The parser reports a request for help or for the version as an error too, with exit code 0.
+ExitStatus reportParseError(const CLI::App &app, const CLI::ParseError &error) {
   if (error.get_exit_code() == 0) {
     (void)app.exit(error, std::cout, std::cerr);
     return kExitSuccess;
@@ -35,7 +36,7 @@ ExitStatus act(CLI::App &app, int argc, char **argv, const Action &action) {
     if (action) return action();
     throw CLI::RequiredError("a sub-command");
   } catch (const CLI::ParseError &error) {
-    return answerParseError(app, error);
+    return reportParseError(app, error);
   } catch (const Failure &failure) {
     return complain(app, failure.status, failure.what());
   } catch (const std::exception &error) {
@@ -48,13 +49,14 @@ ExitStatus act(CLI::App &app, int argc, char **argv, const Action &action) {
 int runTool(const Tool &tool, int argc, char **argv) noexcept {
   try {
     CLI::App app(tool.description, tool.name);
+    app.set_version_flag("--version", versionOf(tool.name), "Print the version and exit");
     Action action;
-    tool.addWords(app, &action);
+    tool.declareOptions(app, &action);
     const ExitStatus status = act(app, argc, argv, action);
     if (std::cout.flush()) return status;
     return complain(app, kExitFailure, "standard output: cannot be written");
   } catch (...) {
-    // Whatever goes wrong with the very frame: there may be no memory to say more.
+    // Not even the parser could be made: there may be no memory for a longer message.
     (void)std::fprintf(stderr, "%s: out of memory\n", tool.name);
     return kExitFailure;
   }

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The frame of every tool: reads the command line, runs the chosen action, and is the one place
-// that prints an error: "TOOL: what: why" on standard error.
+// What every tool does: reads the command line, runs the chosen action, and prints an error as
+// "TOOL: what: why" on standard error. No other code prints errors.
 #pragma once
 
 #include <functional>
@@ -24,19 +24,19 @@ class Failure : public std::runtime_error {
   const ExitStatus status;
 };
 
-// What a command line asks for, set beforehand or by a sub-command's callback; it runs when the
-// whole line has been found right.
+// What a command line asks for, set by the tool or by a sub-command's callback. It runs once the
+// whole line has been parsed.
 using Action = std::function<ExitStatus()>;
 
 struct Tool {
   const char *name;
   const char *description;
-  void (*addWords)(CLI::App &app, Action *action);  // the action lives as long as the app
+  // Adds the options and operands. The action lives as long as the app.
+  void (*declareOptions)(CLI::App &app, Action *action);
 };
 
-// Parses the line, runs the action and answers the exit status; a line that sets none is a usage
-// error. Help goes to standard output; output that cannot be written is a
-// failure.
+// Parses the line, runs the action and returns the exit status. A line that sets no action is a
+// usage error. Help and version go to standard output; output that cannot be written is a failure.
 int runTool(const Tool &tool, int argc, char **argv) noexcept;
 
 }  // namespace Tools

@@ -108,7 +108,6 @@ GroupId EmulatedKernel::create(GroupId parent, std::string_view name) {
     if (!livingMembers(parent).empty()) {
       throw KernelError(Status::kBusy, "processes are in the parent group");
     }
-    requireAnyMemory(parent);
     return store().add(parent, name);
   });
 }
@@ -137,6 +136,11 @@ void EmulatedKernel::setAllocation(GroupId id, Resource resource, const Allocati
   transact(Kind::kWrite, [&] {
     const ResourceRow row = require(id, resource);
     const Allocation wanted = changedAllocation(row.state.allocation, change);
+    const bool disables = resource == Resource::kMemory && wanted.max == 0;
+    if (disables && (id == kHostId || id == kOptId)) {
+      throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be disabled");
+    }
+    requireNoneReservedBelow(row.state, wanted);
     reserve(id, resource, row, wanted);
     if (resource == Resource::kMemory) {
       if (change.max && wanted.max != -1) requireMemoryFor(id, wanted.max);

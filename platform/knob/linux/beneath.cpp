@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What openat2 does in one call is done part by part where a kernel lacks it or a filter forbids
-// it.
+// Where a kernel lacks openat2, or a filter forbids it, a path is opened component by component.
 #include "knob/linux/beneath.h"
 
 #include <fcntl.h>
@@ -19,7 +18,7 @@ namespace {
 using Platform::UniqueFd;
 
 constexpr int kDirectoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
-// The handle of a kernel object's directory: its 64-bit id and nothing else.
+// The type of a cgroup's file handle, which consists of its 64-bit id.
 constexpr int kKernfsHandleType = 0xfe;
 
 struct KernfsHandle {
@@ -36,15 +35,15 @@ int callOpenat2(int directory, const std::string &path, UniqueFd &opened) {
     opened = UniqueFd(
         static_cast<int>(::syscall(SYS_openat2, directory, path.c_str(), &how, sizeof how)));
     if (opened) return 0;
-    // A rename or mount elsewhere on the machine came in between.
+    // A rename or mount on this machine interfered.
     if (errno != EAGAIN && errno != EINTR) return errno;
   }
 }
 
-// No mount has such a number.
+// No mount id has this bit.
 constexpr uint64_t kDeviceMark = uint64_t{1} << 63;
 
-// Without name_to_handle_at: the inode number is the id, and the device stands for the mount.
+// Without name_to_handle_at: the inode number is the id, and the device identifies the mount.
 int identifyByInode(int directory, const char *path, Identity &identity) {
   struct stat status {};
   if (::fstatat(directory, path, &status, AT_SYMLINK_NOFOLLOW | AT_EMPTY_PATH) != 0) return errno;
@@ -59,20 +58,20 @@ bool isCallRefused(int error) {
 }  // namespace
 
 int openBeneath(int directory, std::string_view path, UniqueFd &opened) {
-  if (path.size() >= PATH_MAX) return openPartByPart(directory, path, opened);
+  if (path.size() >= PATH_MAX) return openByComponents(directory, path, opened);
   const int error = callOpenat2(directory, std::string(path), opened);
-  return isCallRefused(error) ? openPartByPart(directory, path, opened) : error;
+  return isCallRefused(error) ? openByComponents(directory, path, opened) : error;
 }
 
-int openPartByPart(int directory, std::string_view path, UniqueFd &opened) {
+int openByComponents(int directory, std::string_view path, UniqueFd &opened) {
   Identity start;
   if (const int error = identify(directory, "", start); error != 0) return error;
   int at = directory;
   for (;;) {
     const size_t end = path.find('/');
-    const std::string part(path.substr(0, end));
-    if (part == "..") return EXDEV;
-    UniqueFd next(::openat(at, part.c_str(), kDirectoryFlags));
+    const std::string name(path.substr(0, end));
+    if (name == "..") return EXDEV;
+    UniqueFd next(::openat(at, name.c_str(), kDirectoryFlags));
     if (!next) return errno;
     Identity there;
     if (const int error = identify(next.get(), "", there); error != 0) return error;
@@ -95,9 +94,9 @@ int identify(int directory, const char *path, Identity &identity) {
     }
     return identifyByInode(directory, path, identity);
   }
-  // EOVERFLOW: another file system's larger handle.
-  const bool noHandle = errno == EOPNOTSUPP || errno == EOVERFLOW || isCallRefused(errno);
-  return noHandle ? identifyByInode(directory, path, identity) : errno;
+  // EOVERFLOW: a larger handle, of another file system.
+  const bool hasNoHandle = errno == EOPNOTSUPP || errno == EOVERFLOW || isCallRefused(errno);
+  return hasNoHandle ? identifyByInode(directory, path, identity) : errno;
 }
 
 int openById(int anyDirectory, GroupId id, UniqueFd &opened) {

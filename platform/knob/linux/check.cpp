@@ -1,16 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// The tree is listed from the top, then gone through from the leaves up, so that every sum is made
-// of reservations that are right already.
+// Lists the tree from the top, then checks it from the leaves up, so that every sum is made of
+// reservations that are correct already.
 #include "knob/linux/check.h"
 
 #include <fcntl.h>
 
-#include <algorithm>
-
-#include "knob/linux/control_values.h"
 #include "knob/linux/fixed_groups.h"
-#include "knob/linux/memory_lowering.h"
-#include "knob/linux/writes.h"
+#include "knob/linux/lowering.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
 #include "knob/signature.h"
@@ -21,14 +17,14 @@ namespace {
 struct Entry {
   GroupId id;
   std::string path;
-  size_t parent;  // its place in the list; the first is its own
+  size_t parent;  // index in the list; that of the first is its own
   int64_t memorySum = 0, cpuSum = 0;
 };
 
 class Checker {
  public:
-  Checker(Groups &groups, Bookkeeper &books, const HostFacts &facts, bool repair)
-      : groups_(groups), books_(books), facts_(facts), repair_(repair) {}
+  Checker(CgroupTree &tree, AllocationManager &allocations, bool repair)
+      : tree_(tree), allocations_(allocations), repair_(repair) {}
 
   std::vector<Finding> run() {
     checkLibrary();
@@ -38,16 +34,16 @@ class Checker {
   }
 
  private:
-  // Records have a version of their own, so another interface's groups can be taken over.
+  // Records have a version of their own, so groups of another interface can be taken over.
   void checkLibrary() {
-    const BuildSignature noted = readSignature(groups_);
-    if (noted.md5 == buildSignature().md5) return;
-    if (repair_) writeSignature(*groups_.host());
+    const BuildSignature stored = readSignature(tree_);
+    if (stored.md5 == buildSignature().md5) return;
+    if (repair_) writeSignature(*tree_.host());
     report(std::string(kRootName),
-           "it was made with a libknob of another interface, built " + noted.buildDate, repair_);
+           "it was made by a libknob with another interface, built " + stored.buildDate, repair_);
   }
 
-  // A group that goes away meanwhile is no finding.
+  // A group that another program deletes meanwhile is not a finding.
   template <typename F>
   void whileThere(const F &f) {
     try {
@@ -58,11 +54,10 @@ class Checker {
   }
 
   void list() {
-    const GroupPtr host = groups_.lookUp(kRootName);
-    entries_.push_back({host->id, std::string(kRootName), 0});
+    entries_.push_back({tree_.host()->id, std::string(kRootName), 0});
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
-        for (const Child &child : groups_.children(*groups_.find(entries_[i].id))) {
+        for (const Child &child : tree_.children(*tree_.find(entries_[i].id))) {
           entries_.push_back({child.id, entries_[i].path + "/" + child.name, i});
         }
       });
@@ -71,43 +66,47 @@ class Checker {
 
   void checkEntry(Entry &entry) {
     whileThere([&] {
-      const GroupPtr group = groups_.find(entry.id);
-      Held held = books_.read(*group);
-      if (held.isDamaged) mendRecord(entry, *group, held);
-      if (held.isStored) checkRecord(entry, *group, held.record);
-      if (!held.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
-        noteMissingRecord(entry, *group, held);
+      const GroupPtr group = tree_.find(entry.id);
+      tree_.requireAlive(*group);
+      StoredRecord stored = readRecord(group->fd());
+      if (stored.isDamaged) repairRecord(entry, *group, stored);
+      if (stored.isStored) checkRecord(entry, *group, stored.record);
+      if (!stored.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
+        checkMissingRecord(entry, *group, stored);
       }
-      if (!held.isStored) return;
-      checkFiles(entry, *group, held.record);
-      const Record &record = held.record;
-      const int64_t memory = reservationOf({record.memory.allocation, entry.memorySum});
-      const int64_t cpu = reservationOf({record.cpu.allocation, entry.cpuSum});
-      if (&entry == &entries_.front()) return checkMachine(memory, cpu);
-      Entry &parent = entries_[entry.parent];
-      parent.memorySum = saturatedSum(parent.memorySum, memory);
-      parent.cpuSum = saturatedSum(parent.cpuSum, cpu);
+      if (!stored.isStored) return;
+      checkFiles(entry, *group, stored.record);
+      addToParent(entry, stored.record);
     });
   }
 
-  void mendRecord(const Entry &entry, Group &group, Held &held) {
+  void addToParent(const Entry &entry, const Record &record) {
+    const int64_t memory = reservationOf({record.memory.allocation, entry.memorySum});
+    const int64_t cpu = reservationOf({record.cpu.allocation, entry.cpuSum});
+    if (&entry == &entries_.front()) return checkMachine(memory, cpu);
+    Entry &parent = entries_[entry.parent];
+    parent.memorySum = changedSum(parent.memorySum, 0, memory);
+    parent.cpuSum = changedSum(parent.cpuSum, 0, cpu);
+  }
+
+  void repairRecord(const Entry &entry, Group &group, StoredRecord &stored) {
     if (repair_) {
-      writeRecord(group, held.record);
-      held.isStored = true;
+      writeRecord(group.fd(), stored.record);
+      stored.isStored = true;
     }
-    report(entry.path, "its record is damaged or of another version; what its files say counts",
+    report(entry.path,
+           "its record is damaged or of another version; its control files are used instead",
            repair_);
   }
 
-  // A group that somebody made in the middle of the tree, or whose record was taken off.
-  void noteMissingRecord(const Entry &entry, Group &group, Held &held) {
-    if (repair_) {
-      writeRecord(group, held.record);
-      held.isStored = true;
-      checkRecord(entry, group, held.record);
-    } else {
-      report(entry.path, "groups below it have reservations, but it has no record", false);
+  // A group that another program made between two of ours, or whose record was removed.
+  void checkMissingRecord(const Entry &entry, Group &group, StoredRecord &stored) {
+    if (!repair_) {
+      return report(entry.path, "groups below it have reservations, but it has no record", false);
     }
+    writeRecord(group.fd(), stored.record);
+    stored.isStored = true;
+    checkRecord(entry, group, stored.record);
   }
 
   void checkRecord(const Entry &entry, Group &group, Record &record) {
@@ -126,35 +125,38 @@ class Checker {
       report(entry.path, std::string(kMemoryHighFile) + " was left lowered", repair_);
       if (repair_) restoreMemoryHigh(group, right);
     }
-    const RecordBytes before = encode(record);
-    if (repair_ && encode(right) != before) writeRecord(group, right);
-    if (repair_) record = right;
+    if (!repair_) return;
+    if (encode(right) != encode(record)) writeRecord(group.fd(), right);
+    record = right;
   }
 
-  void checkSum(const Entry &entry, int64_t kept, int64_t counted, const std::string &unit) {
-    if (kept == counted) return;
+  void checkSum(const Entry &entry, int64_t recorded, int64_t counted, const std::string &unit) {
+    if (recorded == counted) return;
     report(entry.path,
            "its children reserve " + std::to_string(counted) + " " + unit + ", its record says " +
-               std::to_string(kept),
+               std::to_string(recorded),
            repair_);
   }
 
   void checkFiles(const Entry &entry, Group &group, const Record &record) {
-    for (const Deviation &deviation : books_.deviations(group, record)) {
+    for (const Deviation &deviation : allocations_.deviations(group, record)) {
       std::string trouble;
-      if (repair_) trouble = mendFile(group, record, deviation);
+      if (repair_) trouble = repairFile(group, record, deviation);
       report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
     }
   }
 
-  // Why it could not be repaired; empty when it was.
-  std::string mendFile(Group &group, const Record &record, const Deviation &deviation) {
+  // Returns why it could not be repaired; empty when it was.
+  std::string repairFile(Group &group, const Record &record, const Deviation &deviation) {
+    const auto &[control, text] = deviation.expected;
+    const std::string actual = deviation.actual.value_or("");
     try {
-      Writes writes(groups_);
-      if (deviation.control == Control::kMemoryMax) {
-        makeRoomBelow(groups_, group, {record, true, false}, record.memory.allocation.max, writes);
+      UndoableWrites writes(tree_);
+      if (control == Control::kMemoryMax && isLowerLimit(actual, text)) {
+        lowerMemoryMax(tree_, group, {record, true, false}, actual, text, writes);
+      } else {
+        writes.write(group, control, actual, text);
       }
-      writes.control(group, deviation.control, deviation.actual.value_or(""), deviation.expected);
       writes.commit();
       return {};
     } catch (const KernelError &error) {
@@ -164,32 +166,28 @@ class Checker {
   }
 
   void checkMachine(int64_t memory, int64_t cpu) {
-    const int64_t memoryRoom = machineCapacity(facts_, Resource::kMemory);
-    const int64_t cpuRoom = machineCapacity(facts_, Resource::kCpu);
-    if (memory > memoryRoom) {
-      report(std::string(kRootName),
-             "the groups reserve " + std::to_string(memory) + " MB, the machine has " +
-                 std::to_string(memoryRoom),
-             false);
-    }
-    if (cpu > cpuRoom) {
-      report(std::string(kRootName),
-             "the groups reserve " + std::to_string(cpu) + " percent of CPU, the machine has " +
-                 std::to_string(cpuRoom),
-             false);
-    }
-    for (std::string &text : unprotectedAbove(groups_, memory)) {
+    checkCapacity(Resource::kMemory, memory, " MB");
+    checkCapacity(Resource::kCpu, cpu, " percent of CPU");
+    for (std::string &text : unprotectedAbove(tree_.hierarchy(), memory)) {
       report(std::string(kRootName), text, false);
     }
+  }
+
+  void checkCapacity(Resource resource, int64_t reserved, const std::string &unit) {
+    const int64_t capacity = allocations_.capacity(resource);
+    if (reserved <= capacity) return;
+    report(std::string(kRootName),
+           "the groups reserve " + std::to_string(reserved) + unit + ", the machine has " +
+               std::to_string(capacity),
+           false);
   }
 
   void report(const std::string &path, const std::string &text, bool repaired) {
     findings_.push_back({path, text, repaired});
   }
 
-  Groups &groups_;
-  Bookkeeper &books_;
-  const HostFacts &facts_;
+  CgroupTree &tree_;
+  AllocationManager &allocations_;
   const bool repair_;
   std::vector<Entry> entries_;
   std::vector<Finding> findings_;
@@ -197,15 +195,19 @@ class Checker {
 
 }  // namespace
 
-std::vector<std::string> unprotectedAbove(const Groups &groups, int64_t promisedMB) {
+std::vector<Finding> checkTree(CgroupTree &tree, AllocationManager &allocations, bool repair) {
+  return Checker(tree, allocations, repair).run();
+}
+
+std::vector<std::string> unprotectedAbove(const Hierarchy &hierarchy, int64_t promisedMB) {
   std::vector<std::string> findings;
   const uint64_t promised = parseLimit(memoryText(promisedMB)).value_or(0);
   Platform::UniqueFd directory(
-      ::openat(groups.hierarchy().directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  std::string path = groups.hierarchy().path;
+      ::openat(hierarchy.directory.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  std::string path = hierarchy.path;
   while (directory) {
     // The root of the whole hierarchy has no such file, and needs none.
-    const auto text = readControlIfAny(directory.get(), rowOf(Control::kMemoryMin).name);
+    const auto text = readControlIfAny(directory.get(), infoOf(Control::kMemoryMin).name);
     if (!text) break;
     if (parseLimit(*text).value_or(0) < promised) {
       findings.push_back("memory.min of " + path + ", which is not ours, is " + *text +
@@ -217,11 +219,6 @@ std::vector<std::string> unprotectedAbove(const Groups &groups, int64_t promised
         Platform::UniqueFd(::openat(directory.get(), "..", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   }
   return findings;
-}
-
-std::vector<Finding> checkTree(Groups &groups, Bookkeeper &books, const HostFacts &facts,
-                               bool repair) {
-  return Checker(groups, books, facts, repair).run();
 }
 
 }  // namespace Knob::Linux

@@ -1,21 +1,21 @@
 // SPDX-License-Identifier: Apache-2.0
-// Recounts what records keep and compares records with files.
+// Recounts the sums in the records, and compares records with control files.
 #pragma once
 
 #include <string>
 #include <vector>
 
-#include "knob/linux/bookkeeper.h"
-#include "knob/linux/groups.h"
+#include "knob/linux/allocations.h"
+#include "knob/linux/cgroup_tree.h"
 
 namespace Knob::Linux {
 
-// repair: mends what is found, as far as it can be. The caller holds the lock. Throws KernelError.
-std::vector<Finding> checkTree(Groups &groups, Bookkeeper &books, const HostFacts &facts,
-                               bool repair);
+// repair: repairs what is found, as far as possible. The caller holds the TreeLock: exclusive to
+// repair, else shared. Throws KernelError.
+std::vector<Finding> checkTree(CgroupTree &tree, AllocationManager &allocations, bool repair);
 
-// The groups above cgroup-root whose memory.min is smaller than what host has promised: a protected
-// group below one that is not is not protected.
-std::vector<std::string> unprotectedAbove(const Groups &groups, int64_t promisedMB);
+// One text for each group above host whose memory.min is smaller than what host has promised: a
+// protected group below one that is not protected is not protected either.
+std::vector<std::string> unprotectedAbove(const Hierarchy &hierarchy, int64_t promisedMB);
 
 }  // namespace Knob::Linux

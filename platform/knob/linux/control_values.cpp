@@ -10,11 +10,11 @@ namespace Knob::Linux {
 namespace {
 
 constexpr uint64_t kMegabyte = uint64_t{1024} * 1024;
-// Linux counts pages in a signed long: no more bytes than 2^63.
-constexpr int64_t kMostMegabytes = (int64_t{1} << 43) - 1;
+// Linux counts pages in a signed long, so a limit is below 2^63 bytes.
+constexpr int64_t kMaxMegabytes = (int64_t{1} << 43) - 1;
 constexpr int64_t kPeriodMicroseconds = 100000;
 constexpr int64_t kMicrosecondsPerPercent = kPeriodMicroseconds / 100;
-constexpr int64_t kLeastWeight = 1, kMostWeight = 10000;
+constexpr int64_t kMinWeight = 1, kMaxWeight = 10000;
 
 struct ShareLevel {
   int64_t shares, weight;
@@ -25,7 +25,7 @@ int64_t sharesWeight(int64_t shares) {
   for (const ShareLevel &level : kShareLevels) {
     if (level.shares == shares) return level.weight;
   }
-  return std::clamp(shares / 10, kLeastWeight, kMostWeight);
+  return std::clamp(shares / 10, kMinWeight, kMaxWeight);
 }
 
 std::string_view trimmed(std::string_view text) {
@@ -35,13 +35,25 @@ std::string_view trimmed(std::string_view text) {
 
 }  // namespace
 
+ControlTexts controlTextsFor(Resource resource, const ResourceState &state, uint32_t cpus) {
+  const Allocation &allocation = state.allocation;
+  const int64_t reservation = reservationOf(state);
+  if (resource == Resource::kMemory) {
+    return {ControlText{Control::kMemoryMin, memoryText(reservation)},
+            ControlText{Control::kMemoryMax, memoryText(allocation.max)}};
+  }
+  const int64_t weight = cpuWeight(allocation.shares, reservation, cpus);
+  return {ControlText{Control::kCpuWeight, std::to_string(weight)},
+          ControlText{Control::kCpuMax, cpuMaxText(allocation.max)}};
+}
+
 std::string memoryText(int64_t megabytes) {
-  if (megabytes < 0 || megabytes > kMostMegabytes) return "max";
+  if (megabytes < 0 || megabytes > kMaxMegabytes) return "max";
   return std::to_string(static_cast<uint64_t>(megabytes) * kMegabyte);
 }
 
 std::string cpuMaxText(int64_t percent) {
-  // The most percent that a call can carry is far below the most that Linux takes.
+  // Every percentage that a call can carry is far below the largest quota of Linux.
   const std::string quota =
       percent < 0 ? "max" : std::to_string(std::max<int64_t>(percent, 1) * kMicrosecondsPerPercent);
   return quota + " " + std::to_string(kPeriodMicroseconds);
@@ -49,10 +61,10 @@ std::string cpuMaxText(int64_t percent) {
 
 int64_t cpuWeight(int64_t shares, int64_t reservationPercent, uint32_t cpus) {
   const auto count = static_cast<int64_t>(std::max<uint32_t>(cpus, 1));
-  // 10000 parts of 100 percent a CPU. More than all CPUs is all of them.
+  // In 1/10000 of all CPUs, rounded up.
   const int64_t reserved = std::min(reservationPercent, 100 * count);
   const int64_t parts = (reserved * 100 + count - 1) / count;
-  return std::clamp(std::max(sharesWeight(shares), parts), kLeastWeight, kMostWeight);
+  return std::clamp(std::max(sharesWeight(shares), parts), kMinWeight, kMaxWeight);
 }
 
 std::optional<uint64_t> parseLimit(std::string_view text) {
@@ -72,8 +84,8 @@ std::optional<int64_t> parseCpuMax(std::string_view text) {
   const auto period = parseLimit(value.substr(blank + 1));
   if (!quota || !period || *period == 0 || *period == kUnlimited) return std::nullopt;
   if (*quota == kUnlimited) return -1;
-  const uint64_t most = kUnlimited / 100;
-  return static_cast<int64_t>(std::min(*quota, most) * 100 / *period);
+  const uint64_t maxQuota = kUnlimited / 100;
+  return static_cast<int64_t>(std::min(*quota, maxQuota) * 100 / *period);
 }
 
 int64_t minimumMegabytes(uint64_t bytes) {
@@ -85,7 +97,7 @@ int64_t maximumMegabytes(uint64_t bytes) {
 }
 
 int64_t sharesOfWeight(uint64_t weight) {
-  const auto known = static_cast<int64_t>(std::min<uint64_t>(weight, kMostWeight));
+  const auto known = static_cast<int64_t>(std::min<uint64_t>(weight, kMaxWeight));
   for (const ShareLevel &level : kShareLevels) {
     if (level.weight == known) return level.shares;
   }

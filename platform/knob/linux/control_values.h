@@ -1,34 +1,50 @@
 // SPDX-License-Identifier: Apache-2.0
 // The values of control files as text: the one place where MB become bytes and percent become
-// microseconds, and back. Linux takes nonsense without a word, so what is written is made here.
+// microseconds, and back. Linux silently accepts wrong values, so every text that is written is
+// made here.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <limits>
 #include <optional>
 #include <string>
 #include <string_view>
 
+#include "knob/admission.h"
 #include "knob/kernel.h"
+#include "knob/linux/cgroup_files.h"
 
 namespace Knob::Linux {
 
 // "max" in a control file.
 inline constexpr uint64_t kUnlimited = std::numeric_limits<uint64_t>::max();
 
-// memory.min and memory.max. megabytes: 0 and up, or -1 for no limit. More bytes than Linux can
-// count is no limit either.
+// What a control file should contain.
+struct ControlText {
+  Control control;
+  std::string text;
+};
+
+// The two files of one resource. The first is the one that holds the reservation.
+using ControlTexts = std::array<ControlText, 2>;
+
+// cpus: of the machine.
+ControlTexts controlTextsFor(Resource resource, const ResourceState &state, uint32_t cpus);
+
+// memory.min and memory.max. megabytes: 0 and up, or -1 for no limit. A number of bytes that Linux
+// cannot represent is no limit either.
 std::string memoryText(int64_t megabytes);
 
-// cpu.max. percent of one CPU: 0 and up, or -1 for no limit. Linux takes no less than 1000
-// microseconds, so 0 percent is one percent to it.
+// cpu.max. percent of one CPU: 0 and up, or -1 for no limit. The smallest quota of Linux is 1000
+// microseconds, so 0 percent is written as 1.
 std::string cpuMaxText(int64_t percent);
 
 // cpu.weight, 1 to 10000: the larger of what the shares ask for (low 50, normal 100, high 200, a
 // number divided by 10) and of the reservation's part of all CPUs in 1/10000, rounded up.
 int64_t cpuWeight(int64_t shares, int64_t reservationPercent, uint32_t cpus);
 
-// A decimal number or "max", with or without the line's end. Nothing: neither.
+// A decimal number or "max", with or without a line feed at its end. Nothing: it is neither.
 std::optional<uint64_t> parseLimit(std::string_view text);
 
 // The whole percent that a text of cpu.max, "QUOTA PERIOD", allows, rounded down; -1 for no limit.
@@ -38,7 +54,7 @@ std::optional<int64_t> parseCpuMax(std::string_view text);
 int64_t minimumMegabytes(uint64_t bytes);
 int64_t maximumMegabytes(uint64_t bytes);
 
-// The shares that a weight stands for; the three levels by their names.
+// The shares that give a weight: -2, -3 or -4 where one of these does.
 int64_t sharesOfWeight(uint64_t weight);
 
 // The number of "KEY NUMBER" in a text of such lines.

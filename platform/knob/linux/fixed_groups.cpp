@@ -1,11 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// A package is upgraded while groups exist: the note keeps the first library's date, and what is
-// compared is the interface alone. So only an upgrade that changes the interface is a mismatch, and
+// A package is upgraded while groups exist: the attribute keeps the first library's build date, and
+// only the interface is compared. So only an upgrade that changes the interface is a mismatch, and
 // only as long as groups of the older one remain.
 #include "knob/linux/fixed_groups.h"
 
-#include "knob/linux/control_file.h"
-#include "knob/linux/record.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/names.h"
 #include "knob/signature.h"
 
@@ -18,71 +17,75 @@ std::string optPath() {
   return std::string(kRootName) + "/" + std::string(kFixedChildName);
 }
 
-[[noreturn]] void notUsable(const Groups &groups, const KernelError &error) {
-  std::string mend;
+[[noreturn]] void notUsable(const CgroupTree &tree, const KernelError &error) {
+  std::string whatToDo;
   if (error.status == Status::kPermissionDenied) {
-    mend = kMendRights;
+    whatToDo = kHowToGetRights;
   } else if (error.status == Status::kBusy) {
-    mend = "; processes live in " + groups.hierarchy().path +
-           " itself: move them to a group below it, or let cgroup-root name another";
+    whatToDo = "; processes are in " + tree.hierarchy().path +
+               " itself: move them to a group below it, or set cgroup-root to another group";
   }
-  throw KernelError(Status::kKernelNotUsable, std::string(error.what()) + mend);
+  throw KernelError(Status::kKernelNotUsable, std::string(error.what()) + whatToDo);
 }
 
-// Somebody else may be making the same group at this moment.
-GroupPtr makeIfMissing(Groups &groups, Group *parent, const std::string &path) {
-  if (GroupPtr group = groups.lookUp(path)) return group;
+// Another process may be making the same group at this moment.
+GroupPtr makeIfMissing(CgroupTree &tree, Group *parent, const std::string &path) {
+  if (GroupPtr group = tree.lookUp(path)) return group;
   try {
-    if (parent == nullptr) return groups.makeHost();
-    groups.passOn(*parent);
-    return groups.make(*parent, kFixedChildName);
+    if (parent == nullptr) return tree.makeHost();
+    return tree.make(*parent, kFixedChildName);
   } catch (const KernelError &error) {
     if (error.status != Status::kExists) throw;
   }
-  return groups.lookUp(path);
+  return tree.lookUp(path);
 }
 
-// Whether there is nothing in the tree but the two.
-bool isUntouched(Groups &groups, const Group &host) {
-  for (const Child &child : groups.children(host)) {
+// Whether there are no groups but the two.
+bool isUntouched(CgroupTree &tree, const Group &host) {
+  for (const Child &child : tree.children(host)) {
     if (child.name != kFixedChildName) return false;
-    const GroupPtr opt = groups.lookUp(optPath());
-    if (opt && groups.hasChildren(*opt)) return false;
+    const GroupPtr opt = tree.lookUp(optPath());
+    if (opt && tree.hasChildren(*opt)) return false;
   }
   return true;
 }
 
 }  // namespace
 
-void makeFixedGroups(Groups &groups) {
+bool isFixedGroup(CgroupTree &tree, Group &group) {
+  const GroupPtr parent = tree.parentOf(group);
+  return !parent || (!tree.parentOf(*parent) && tree.nameOf(group) == kFixedChildName);
+}
+
+void makeFixedGroups(CgroupTree &tree) {
   try {
-    const GroupPtr host = makeIfMissing(groups, nullptr, std::string(kRootName));
+    const GroupPtr host = makeIfMissing(tree, nullptr, std::string(kRootName));
     if (!host) return;
-    if (!readAttribute(host->directory, kLibraryAttribute)) writeSignature(*host);
-    (void)makeIfMissing(groups, host.get(), optPath());
+    if (!readAttribute(host->fd(), kLibraryAttribute)) writeSignature(*host);
+    (void)makeIfMissing(tree, host.get(), optPath());
   } catch (const KernelError &error) {
-    notUsable(groups, error);
+    notUsable(tree, error);
   }
 }
 
-BuildSignature readSignature(Groups &groups) {
+BuildSignature readSignature(CgroupTree &tree) {
   BuildSignature own = buildSignature();
-  const GroupPtr host = groups.lookUp(kRootName);
+  const GroupPtr host = tree.lookUp(kRootName);
   if (!host) return own;
-  const auto text = readAttribute(host->directory, kLibraryAttribute);
-  const auto noted = text ? parseSignature(*text) : std::nullopt;
-  if (!noted) return own;
-  if (noted->md5 == own.md5 || !isUntouched(groups, *host)) return *noted;
+  const auto text = readAttribute(host->fd(), kLibraryAttribute);
+  const auto stored = text ? parseSignature(*text) : std::nullopt;
+  if (!stored) return own;
+  if (stored->md5 == own.md5 || !isUntouched(tree, *host)) return *stored;
   try {
     writeSignature(*host);
   } catch (const KernelError &) {
-    // Without the right to write, the note stays for one who has it.
+    // A process without the right to write leaves it to one that has it.
   }
   return own;
 }
 
 void writeSignature(const Group &host) {
-  writeAttribute(host.directory, kLibraryAttribute, signatureText(buildSignature()));
+  writeAttribute(host.fd(), kLibraryAttribute, signatureText(buildSignature()));
 }
 
 std::string signatureText(const BuildSignature &signature) {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Every reason stands alone: what is missing, then how to mend it.
+// Each reason is one sentence: what is missing, then what to do.
 #include "knob/linux/hierarchy.h"
 
 #include <fcntl.h>
@@ -7,13 +7,14 @@
 #include <sys/vfs.h>
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
+#include <charconv>
+#include <optional>
 #include <system_error>
 
 #include "common/read_file.h"
 #include "knob/linux/beneath.h"
-#include "knob/linux/control_file.h"
+#include "knob/linux/cgroup_files.h"
 #include "knob/linux/control_values.h"
 
 namespace Knob::Linux {
@@ -22,9 +23,75 @@ namespace {
 using Platform::UniqueFd;
 
 constexpr const char *kMountInfoFile = "/proc/self/mountinfo";
-constexpr size_t kMostMountInfoBytes = size_t{16} * 1024 * 1024;
+constexpr size_t kMaxMountInfoBytes = size_t{16} * 1024 * 1024;
 constexpr const char *kUnifiedBoot =
     "boot with systemd.unified_cgroup_hierarchy=1, or with cgroup_no_v1=all";
+
+// A line of mountinfo: ID PARENT MAJOR:MINOR ROOT POINT OPTIONS [OPTIONAL...] - TYPE SOURCE
+// SUPEROPTIONS. In a field a blank or backslash is a backslash and three octal digits.
+constexpr size_t kIdField = 0, kRootField = 3, kPointField = 4, kOptionsField = 5;
+// After the lone "-": type, source, super options.
+constexpr size_t kTypeField = 1, kSuperOptionsField = 3;
+
+std::vector<std::string_view> split(std::string_view text, char separator) {
+  std::vector<std::string_view> parts;
+  for (size_t start = 0; start <= text.size();) {
+    const size_t end = std::min(text.find(separator, start), text.size());
+    if (end > start) parts.push_back(text.substr(start, end - start));
+    start = end + 1;
+  }
+  return parts;
+}
+
+bool isOctal(char c) {
+  return c >= '0' && c <= '7';
+}
+
+std::string unescaped(std::string_view field) {
+  std::string text;
+  for (size_t at = 0; at < field.size(); ++at) {
+    const std::string_view digits = field.substr(at + 1, 3);
+    if (field[at] == '\\' && digits.size() == 3 &&
+        std::all_of(digits.begin(), digits.end(), isOctal)) {
+      text += static_cast<char>((digits[0] - '0') * 64 + (digits[1] - '0') * 8 + digits[2] - '0');
+      at += 3;
+    } else {
+      text += field[at];
+    }
+  }
+  return text;
+}
+
+bool hasOption(std::string_view options, std::string_view option) {
+  const auto all = split(options, ',');
+  return std::find(all.begin(), all.end(), option) != all.end();
+}
+
+std::optional<int> number(std::string_view digits) {
+  int value = 0;
+  const auto [stop, error] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
+  if (error != std::errc() || stop != digits.data() + digits.size()) return std::nullopt;
+  return value;
+}
+
+void addLine(CgroupMounts &mounts, std::string_view line) {
+  const std::vector<std::string_view> fields = split(line, ' ');
+  const auto dash = std::find(fields.begin(), fields.end(), "-");
+  const auto before = static_cast<size_t>(dash - fields.begin());
+  if (before <= kOptionsField || fields.size() - before <= kSuperOptionsField) return;
+
+  const std::string_view type = dash[kTypeField], superOptions = dash[kSuperOptionsField];
+  if (type == "cgroup") {
+    for (std::string_view option : split(superOptions, ',')) {
+      mounts.legacyControllers.emplace_back(option);
+    }
+  }
+  const std::optional<int> id = number(fields[kIdField]);
+  if (type != "cgroup2" || !id) return;
+  mounts.unified.push_back(
+      {*id, unescaped(fields[kRootField]), unescaped(fields[kPointField]),
+       hasOption(fields[kOptionsField], "ro") || hasOption(superOptions, "ro")});
+}
 
 [[noreturn]] void notUsable(const std::string &reason) {
   throw KernelError(Status::kKernelNotUsable, reason);
@@ -36,14 +103,14 @@ std::string systemText(int error) {
 
 CgroupMounts readMounts() {
   try {
-    return parseMountInfo(Platform::readFile(kMountInfoFile, kMostMountInfoBytes));
+    return parseMountInfo(Platform::readFile(kMountInfoFile, kMaxMountInfoBytes));
   } catch (const std::system_error &error) {
     notUsable(std::string("cannot read ") + kMountInfoFile + ": " +
               systemText(error.code().value()) + "; mount proc on /proc");
   }
 }
 
-// A mount that another one hides is not reached through its path.
+// Nothing when another mount hides it.
 UniqueFd openMount(const CgroupMount &mount) {
   UniqueFd directory(::open(mount.point.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   struct statfs status {};
@@ -59,8 +126,8 @@ struct OpenMount {
   CgroupMount mount;
 };
 
-// All of them show one hierarchy. The whole is better than a part of it, and one that can be
-// written better than one that cannot.
+// All of them show the same hierarchy. One that shows the whole is better than one that shows a
+// part, and a writable one better than a read-only one.
 OpenMount openBestMount(const CgroupMounts &mounts) {
   const auto rank = [](const CgroupMount &mount) {
     return (mount.root == "/" ? 2 : 0) + (mount.readOnly ? 0 : 1);
@@ -77,7 +144,7 @@ OpenMount openBestMount(const CgroupMounts &mounts) {
   }
   const CgroupMount &first = mounts.unified.front();
   notUsable("the cgroup2 mount at " + first.point +
-            " cannot be opened: it is hidden by another mount, or there is no right to it");
+            " cannot be opened: it is hidden by another mount, or you may not read it");
 }
 
 std::string withoutSlashes(const std::string &path) {
@@ -97,17 +164,17 @@ UniqueFd openFolder(int mountDirectory, const std::string &folder, const std::st
   notUsable(start);
 }
 
-bool isHeldByOldHierarchy(const CgroupMounts &mounts, const std::string &controller) {
-  const auto &held = mounts.legacyControllers;
-  return std::find(held.begin(), held.end(), controller) != held.end();
+bool isInOldHierarchy(const CgroupMounts &mounts, const std::string &controller) {
+  const auto &legacy = mounts.legacyControllers;
+  return std::find(legacy.begin(), legacy.end(), controller) != legacy.end();
 }
 
-// In the root of the whole hierarchy a controller is missing because somebody else has it, or
-// because the kernel does not offer it; below, because the group above does not pass it on.
+// In the root of the whole hierarchy a controller is missing because the old hierarchy has it, or
+// because the kernel does not offer it; below, because the group above does not enable it.
 std::string whyMissing(const std::string &controller, const CgroupMounts &mounts,
                        const std::string &folder, bool isTop) {
-  if (isHeldByOldHierarchy(mounts, controller)) {
-    return "the " + controller + " controller is held by the old cgroup hierarchy; " + kUnifiedBoot;
+  if (isInOldHierarchy(mounts, controller)) {
+    return "the " + controller + " controller belongs to the old cgroup hierarchy; " + kUnifiedBoot;
   }
   if (isTop) {
     return "this kernel offers no " + controller + " controller to cgroup2 (" + folder +
@@ -115,18 +182,24 @@ std::string whyMissing(const std::string &controller, const CgroupMounts &mounts
            " and without cgroup_no_v1 or v1 mounts "
            "that name it, or use a kernel built with it";
   }
-  return "the " + controller + " controller is not passed on to " + folder + "; write +" +
+  return "the " + controller + " controller is not enabled in " + folder + "; write +" +
          controller +
          " to the cgroup.subtree_control of the group above it (in a systemd service: "
          "Delegate=memory cpu)";
 }
 
 bool isTopOfHierarchy(int directory) {
-  // The one group that has no type and no limits of its own.
+  // It is the only group without this file.
   return !readControlIfAny(directory, "cgroup.type").has_value();
 }
 
 }  // namespace
+
+CgroupMounts parseMountInfo(std::string_view text) {
+  CgroupMounts mounts;
+  for (std::string_view line : split(text, '\n')) addLine(mounts, line);
+  return mounts;
+}
 
 std::string missingControllers(const std::string &controllers, const CgroupMounts &mounts,
                                const std::string &folder, bool isTop) {

@@ -1,31 +1,42 @@
 // SPDX-License-Identifier: Apache-2.0
-// The place where the tree stands: finding the cgroup2 mount and the folder below it, and telling
-// what a host lacks that cannot be used, with the way to mend it.
+// Where the tree is: finds the cgroup2 mount and the folder below it, and explains what a machine
+// lacks that cannot be used, and what to do.
 #pragma once
 
 #include <string>
+#include <string_view>
+#include <vector>
 
 #include "common/unique_fd.h"
 #include "knob/configuration.h"
-#include "knob/linux/mount_info.h"
 
 namespace Knob::Linux {
 
-// The controllers that a group needs, and how they are passed on to the groups below one: in one
-// write, since "+cpu" alone would succeed in a group with processes and make it a threaded one.
-inline constexpr const char *kPassOn = "+memory +cpu";
-inline constexpr const char *kTakeBack = "-memory -cpu";
+struct CgroupMount {
+  int id = 0;
+  std::string root;   // the group that the mount shows as its root; "/" is the whole hierarchy
+  std::string point;  // where it is mounted
+  bool readOnly = false;
+};
+
+struct CgroupMounts {
+  std::vector<CgroupMount> unified;            // cgroup2, in the order of mounting
+  std::vector<std::string> legacyControllers;  // named by mounts of the old hierarchies
+};
+
+// From the text of /proc/self/mountinfo. Ignores lines that do not describe a mount.
+CgroupMounts parseMountInfo(std::string_view text);
 
 struct Hierarchy {
-  Platform::UniqueFd directory;  // the folder that holds, or will hold, host
+  Platform::UniqueFd directory;  // the folder that contains, or will contain, host
   std::string path;              // of that folder, for people
 };
 
-// Throws KernelError: kernel not usable, with the reason and how to mend it.
+// Throws KernelError: kernel not usable, with the reason and what to do.
 Hierarchy openHierarchy(const Configuration &configuration);
 
-// How a cgroup.controllers that lacks memory or cpu is told, given the mounts; empty when it lacks
-// neither. folder: for the message. isTop: it is the whole hierarchy's root.
+// Why a cgroup.controllers lacks memory or cpu, given the mounts; empty when it lacks neither.
+// folder: for the message. isTop: it is the root of the whole hierarchy.
 std::string missingControllers(const std::string &controllers, const CgroupMounts &mounts,
                                const std::string &folder, bool isTop);
 

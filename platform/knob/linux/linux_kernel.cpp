@@ -1,28 +1,207 @@
 // SPDX-License-Identifier: Apache-2.0
-// Opens the Linux kernel of this machine, and looks at it from outside.
+// Each operation of the kernel interface. One that changes something holds the lock on the tree
+// from its first look at a group to its last write. Reading one group needs no lock: its record is
+// one attribute, which Linux reads and writes whole.
 #include "knob/linux/linux_kernel.h"
 
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <utility>
+
+#include "knob/linux/allocations.h"
 #include "knob/linux/check.h"
+#include "knob/linux/control_values.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/hierarchy.h"
-#include "knob/linux/kernel_on_groups.h"
+#include "knob/linux/lowering.h"
+#include "knob/linux/tree_lock.h"
+#include "knob/machine_facts.h"
+#include "knob/names.h"
 
 namespace Knob {
+namespace Linux {
 namespace {
 
-bool mayWrite(int directory, const char *name) {
-  return ::faccessat(directory, name, W_OK, AT_EACCESS) == 0;
+HostFacts factsWith(uint32_t maxVms) {
+  HostFacts facts = readMachineFacts();
+  facts.maxVms = maxVms;
+  return facts;
 }
 
-// A group's files can belong to somebody else than its directory.
-bool mayMakeGroupsIn(int directory) {
-  return mayWrite(directory, ".") && mayWrite(directory, Linux::kSubtreeFile);
+bool isFixed(const std::vector<std::string_view> &path) {
+  return path.size() == 1 || (path.size() == 2 && path[1] == kFixedChildName);
 }
 
-// Whatever goes wrong before there is a kernel means that there is none.
+GroupUsage usageOf(const Group &group) {
+  GroupUsage usage;
+  if (const auto bytes = readControlIfAny(group.fd(), kMemoryCurrentFile)) {
+    usage.memoryBytes = parseLimit(*bytes);
+  }
+  if (const auto text = readControlIfAny(group.fd(), kCpuStatFile)) {
+    usage.cpuMicroseconds = keyedValue(*text, "usage_usec");
+  }
+  return usage;
+}
+
+class LinuxKernel final : public Kernel {
+ public:
+  LinuxKernel(Hierarchy hierarchy, uint32_t maxVms)
+      : tree_(std::move(hierarchy)), facts_(factsWith(maxVms)), allocations_(tree_, facts_) {}
+
+  GroupId lookUp(std::string_view path) override {
+    const auto components = splitPath(path);
+    if (!components || components->front() != kRootName) noSuchGroup();
+    GroupPtr group = tree_.lookUp(path);
+    if (!group && isFixed(*components)) {
+      makeFixedGroups(tree_);
+      group = tree_.lookUp(path);
+    }
+    if (!group) noSuchGroup();
+    return group->id;
+  }
+
+  GroupId create(GroupId parent, std::string_view name) override {
+    if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "not a name for a group");
+    const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
+    const GroupPtr above = find(parent);
+    const GroupPtr group = make(above, name);
+    try {
+      writeRecord(group->fd(), Record());
+    } catch (const KernelError &) {
+      removeQuietly(*group, *above);
+      throw;
+    }
+    return group->id;
+  }
+
+  void remove(GroupId id) override {
+    const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
+    const GroupPtr group = find(id);
+    if (isFixedGroup(tree_, *group)) {
+      throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be deleted");
+    }
+    allocations_.remove(*group, *tree_.parentOf(*group));
+  }
+
+  Allocation readAllocation(GroupId id, Resource resource) override {
+    return readRecord(find(id)->fd()).record.state(resource).allocation;
+  }
+
+  void setAllocation(GroupId id, Resource resource, const AllocationChange &change) override {
+    const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
+    const GroupPtr group = find(id);
+    if (resource == Resource::kMemory && change.max == 0 && isFixedGroup(tree_, *group)) {
+      throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be disabled");
+    }
+    allocations_.change(*group, resource, change);
+  }
+
+  std::vector<GroupId> childGroups(GroupId id) override {
+    std::vector<GroupId> ids;
+    for (const Child &child : tree_.children(*find(id))) ids.push_back(child.id);
+    return ids;
+  }
+
+  std::vector<int64_t> members(GroupId id) override { return readMembers(find(id)->fd()); }
+
+  void join(GroupId id, int64_t pid) override {
+    const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
+    const GroupPtr group = find(id);
+    if (tree_.hasChildren(*group)) throw KernelError(Status::kBusy, "the group has child groups");
+    // Linux would move the process, and kill it as soon as it needs a page.
+    requireAnyMemory(group);
+    tree_.addMember(*group, pid);
+  }
+
+  MemoryStatistics memoryStatistics(GroupId id) override {
+    return readRecord(find(id)->fd()).record.peaks;
+  }
+
+  HostFacts facts() override { return facts_; }
+
+  BuildSignature signature() override { return readSignature(tree_); }
+
+  GroupView view(GroupId id) override;
+
+  std::vector<Finding> check(bool repair) override {
+    makeFixedGroups(tree_);
+    const TreeLock lock(host()->fd(),
+                        repair ? TreeLock::Kind::kExclusive : TreeLock::Kind::kShared);
+    return checkTree(tree_, allocations_, repair);
+  }
+
+ private:
+  GroupPtr host() {
+    if (GroupPtr group = tree_.host()) return group;
+    makeFixedGroups(tree_);
+    if (GroupPtr group = tree_.host()) return group;
+    noSuchGroup();
+  }
+
+  GroupPtr find(GroupId id) {
+    GroupPtr group = tree_.find(id);
+    tree_.requireAlive(*group);
+    return group;
+  }
+
+  GroupPtr make(const GroupPtr &parent, std::string_view name) {
+    try {
+      return tree_.make(*parent, name);
+    } catch (const KernelError &error) {
+      if (error.status != Status::kOutOfMemory) throw;
+    }
+    const LiftedMaximum lifted(tree_, parent);
+    return tree_.make(*parent, name);
+  }
+
+  // The group itself and all above it have a memory maximum other than 0.
+  void requireAnyMemory(GroupPtr group) {
+    for (; group; group = tree_.parentOf(*group)) {
+      if (readControlIfAny(group->fd(), infoOf(Control::kMemoryMax).name) == "0") {
+        throw KernelError(Status::kOutOfMemory,
+                          "the memory maximum of " + tree_.nameOf(*group) + " is 0");
+      }
+    }
+  }
+
+  // For a caller that reports an earlier error.
+  void removeQuietly(Group &group, Group &parent) noexcept {
+    try {
+      tree_.remove(group, parent);
+    } catch (const std::exception &) {
+      // Another program has removed it or uses it.
+    }
+  }
+
+  CgroupTree tree_;
+  const HostFacts facts_;
+  AllocationManager allocations_;
+};
+
+GroupView LinuxKernel::view(GroupId id) {
+  const TreeLock lock(host()->fd(), TreeLock::Kind::kShared);
+  const GroupPtr group = find(id);
+  const StoredRecord stored = readRecord(group->fd());
+
+  GroupView view;
+  view.id = id;
+  view.name = tree_.nameOf(*group);
+  view.memory = stored.record.memory.allocation;
+  view.cpu = stored.record.cpu.allocation;
+  view.memoryReservationMB = reservationOf(stored.record.memory);
+  view.cpuReservationPercent = reservationOf(stored.record.cpu);
+  view.usage = usageOf(*group);
+  if (stored.isDamaged) view.deviation = "its record cannot be read";
+  if (stored.isStored) {
+    for (const Deviation &deviation : allocations_.deviations(*group, stored.record)) {
+      view.deviation += (view.deviation.empty() ? "" : "; ") + textOf(deviation);
+    }
+  }
+  return view;
+}
+
+// An error before there is a kernel means that there is none.
 template <typename F>
 auto beforeUse(const F &f) {
   try {
@@ -32,39 +211,45 @@ auto beforeUse(const F &f) {
   }
 }
 
-LinuxHost lookAt(const Configuration &configuration) {
-  Linux::Groups groups(Linux::openHierarchy(configuration));
-  LinuxHost host;
-  host.path = groups.hierarchy().path;
-  const Linux::GroupPtr group = groups.host();
-  host.hasGroups = group != nullptr;
+// A group's files and its directory can have different owners.
+bool mayMakeGroupsIn(int directory) {
+  for (const char *name : {".", kSubtreeFile}) {
+    if (::faccessat(directory, name, W_OK, AT_EACCESS) != 0) return false;
+  }
+  return true;
+}
 
-  if (!mayMakeGroupsIn(group ? group->directory : groups.hierarchy().directory.get())) {
-    host.problems.push_back("no right to make or change groups in " + host.path +
-                            Linux::kMendRights);
+LinuxHost lookAt(const Configuration &configuration) {
+  CgroupTree tree(openHierarchy(configuration));
+  LinuxHost result;
+  result.path = tree.hierarchy().path;
+  const GroupPtr host = tree.host();
+  result.hasGroups = host != nullptr;
+
+  if (!mayMakeGroupsIn(host ? host->fd() : tree.hierarchy().directory.get())) {
+    result.problems.push_back("no right to make or change groups in " + result.path +
+                              kHowToGetRights);
   }
-  if (!group) return host;
-  HostFacts unused;
-  const Linux::Held held = Linux::Bookkeeper(groups, unused).read(*group);
-  const ResourceState &memory = held.record.memory;
-  const int64_t promised = reservationOf(memory);
-  for (std::string &text : Linux::unprotectedAbove(groups, promised)) {
-    host.problems.push_back(std::move(text));
+  if (!host) return result;
+  const int64_t promisedMB = reservationOf(readRecord(host->fd()).record.memory);
+  for (std::string &text : unprotectedAbove(tree.hierarchy(), promisedMB)) {
+    result.problems.push_back(std::move(text));
   }
-  return host;
+  return result;
 }
 
 }  // namespace
+}  // namespace Linux
 
 std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration) {
-  return beforeUse([&] {
-    return std::make_unique<Linux::KernelOnGroups>(Linux::openHierarchy(configuration),
-                                                   configuration.maxVms);
+  return Linux::beforeUse([&] {
+    return std::make_unique<Linux::LinuxKernel>(Linux::openHierarchy(configuration),
+                                                configuration.maxVms);
   });
 }
 
 LinuxHost lookAtLinuxHost(const Configuration &configuration) {
-  return beforeUse([&] { return lookAt(configuration); });
+  return Linux::beforeUse([&] { return Linux::lookAt(configuration); });
 }
 
 }  // namespace Knob

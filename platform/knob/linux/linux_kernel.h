@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The Linux kernel as the rest of libknob sees it: groups are cgroup v2 groups of this machine, and
-// a reservation is the kernel's own. There is no state but the kernel's.
+// Linux itself enforces a reservation. All state is in cgroups.
 #pragma once
 
 #include <memory>
@@ -12,17 +12,17 @@
 
 namespace Knob {
 
-// Throws KernelError: kernel not usable, with the reason and how to mend it. Makes nothing yet.
+// Throws KernelError: kernel not usable, with the reason and what to do. Makes no groups yet.
 std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration);
 
-// Where the groups of this host stand, for people.
+// Where this machine's groups are, for people.
 struct LinuxHost {
-  std::string path;                   // of the folder that holds, or will hold, host
-  bool hasGroups = false;             // whether host is there yet
-  std::vector<std::string> problems;  // what is missing, and how to mend it
+  std::string path;                   // of the folder that contains, or will contain, host
+  bool hasGroups = false;             // whether host exists
+  std::vector<std::string> problems;  // each with what to do
 };
 
-// Looks and makes nothing. Throws KernelError: kernel not usable, with the reason.
+// Only looks. Throws KernelError: kernel not usable, with the reason.
 LinuxHost lookAtLinuxHost(const Configuration &configuration);
 
 }  // namespace Knob

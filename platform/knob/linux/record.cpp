@@ -1,11 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
-// The layout: a version, flags, then 64-bit numbers in the machine's own byte order, since no
-// record ever leaves the machine.
+// The layout: a version, flags, then 64-bit numbers in the machine's own byte order, since a record
+// never leaves the machine.
 #include "knob/linux/record.h"
 
+#include <algorithm>
 #include <cstring>
+#include <limits>
 
 #include "knob/allocation.h"
+#include "knob/linux/cgroup_files.h"
+#include "knob/linux/control_values.h"
+#include "knob/peaks.h"
 
 namespace Knob::Linux {
 namespace {
@@ -27,24 +32,44 @@ static_assert(sizeof(PackedState) == 40 && sizeof(Packed) == kRecordSize);
 static_assert(offsetof(Packed, memory) == 8 && offsetof(Packed, cpu) == 48 &&
               offsetof(Packed, ownPeakKB) == 88 && offsetof(Packed, savedHigh) == 104);
 
-PackedState packed(const ResourceState &books) {
-  const Allocation &allocation = books.allocation;
+PackedState packed(const ResourceState &state) {
+  const Allocation &allocation = state.allocation;
   return {allocation.min, allocation.max, allocation.minLimit, allocation.shares,
-          books.childrenSum};
+          state.childrenSum};
 }
 
 ResourceState unpacked(const PackedState &from) {
   return {{from.min, from.max, from.minLimit, from.shares}, from.childrenSum};
 }
 
-// An allocation that a set would refuse is none that a set has written.
-bool isSound(const ResourceState &books) {
+// Whether an operation can have written this.
+bool isSound(const ResourceState &state) {
   try {
-    (void)changedAllocation(books.allocation, {});
-    return books.childrenSum >= 0;
+    (void)changedAllocation(state.allocation, {});
+    return state.childrenSum >= 0;
   } catch (const KernelError &) {
     return false;
   }
+}
+
+uint64_t limitIn(int directory, Control control) {
+  const uint64_t initial = parseLimit(infoOf(control).initialText).value_or(0);
+  const auto text = readControlIfAny(directory, infoOf(control).name);
+  return text ? parseLimit(*text).value_or(initial) : initial;
+}
+
+// The nearest that our settings can express. No file holds a CPU minimum.
+Record readFiles(int directory) {
+  Record record;
+  record.memory.allocation.min = minimumMegabytes(limitIn(directory, Control::kMemoryMin));
+  record.memory.allocation.max = maximumMegabytes(limitIn(directory, Control::kMemoryMax));
+  record.cpu.allocation.shares = sharesOfWeight(limitIn(directory, Control::kCpuWeight));
+  constexpr int64_t kMaxPercent = std::numeric_limits<int32_t>::max();
+  if (const auto text = readControlIfAny(directory, infoOf(Control::kCpuMax).name)) {
+    record.cpu.allocation.max = std::min(parseCpuMax(*text).value_or(-1), kMaxPercent);
+  }
+  record.peaks = raisedPeaks({}, record.memory.allocation.min, 0);
+  return record;
 }
 
 }  // namespace
@@ -75,6 +100,18 @@ std::optional<Record> decode(std::string_view bytes) {
   if ((from.flags & kHasSavedHigh) != 0) record.savedHigh = from.savedHigh;
   if (!isSound(record.memory) || !isSound(record.cpu)) return std::nullopt;
   return record;
+}
+
+StoredRecord readRecord(int directory) {
+  const auto bytes = readAttribute(directory, kRecordAttribute);
+  if (!bytes) return {readFiles(directory), false, false};
+  if (const auto record = decode(*bytes)) return {*record, true, false};
+  return {readFiles(directory), false, true};
+}
+
+void writeRecord(int directory, const Record &record) {
+  const RecordBytes bytes = encode(record);
+  writeAttribute(directory, kRecordAttribute, {bytes.data(), bytes.size()});
 }
 
 }  // namespace Knob::Linux

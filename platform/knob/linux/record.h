@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 // What Linux has no file for: the record of a group, kept in one extended attribute of its
-// directory, so that it goes when the group goes. A group without one was never set by us.
+// directory, so that it is deleted with the group. libknob writes one for each group that it makes;
+// a group without a record was made by another program.
 #pragma once
 
 #include <array>
@@ -15,14 +16,12 @@
 namespace Knob::Linux {
 
 inline constexpr const char *kRecordAttribute = "user.knob";
-// Of host alone: the library that made it, "MD5 BUILDDATE".
-inline constexpr const char *kLibraryAttribute = "user.knob.library";
 
 struct Record {
   ResourceState memory, cpu;
   MemoryStatistics peaks;
-  // The text of memory.high while it is lowered to make a smaller maximum possible: bytes, or
-  // kUnlimited. Whoever finds it there puts it back: the one who lowered it has died.
+  // The value of memory.high, in bytes or kUnlimited, while it is lowered to make a smaller maximum
+  // possible. Another process that finds it here restores it: the one that lowered it has died.
   std::optional<uint64_t> savedHigh;
 
   ResourceState &state(Resource resource) { return resource == Resource::kMemory ? memory : cpu; }
@@ -31,12 +30,23 @@ struct Record {
   }
 };
 
+// A group's record as it is stored, or what its control files say where no record is stored.
+struct StoredRecord {
+  Record record;
+  bool isStored = false;
+  bool isDamaged = false;  // there is a record, but it cannot be read
+};
+
 inline constexpr size_t kRecordSize = 112;
 using RecordBytes = std::array<char, kRecordSize>;
 
 RecordBytes encode(const Record &record);
 
-// Nothing: another version, another size, or values that no operation leaves behind.
+// Nothing: another version, another size, or values that no operation writes.
 std::optional<Record> decode(std::string_view bytes);
+
+// directory: the group's. Throw KernelError.
+StoredRecord readRecord(int directory);
+void writeRecord(int directory, const Record &record);
 
 }  // namespace Knob::Linux

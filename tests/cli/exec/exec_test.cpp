@@ -33,7 +33,7 @@ class Exec : public testing::Test {
     EXPECT_EQ(result.out, "");
   }
 
-  // Whether the command can take a file for a program.
+  // An executable file, or one that is not, depending on MODE.
   std::filesystem::path script(const std::string &text, mode_t mode) {
     const std::filesystem::path path = world.folder() / "pool-script";
     writeFile(path, text);
@@ -44,7 +44,7 @@ class Exec : public testing::Test {
   World world;
 };
 
-TEST_F(Exec, TheCommandsStreamsAndStatusAreItsOwn) {
+TEST_F(Exec, StreamsAndStatusAreTheCommands) {
   world.input = "in";
   const ProcessResult result =
       exec({"web", "--", "/bin/sh", "-c", "cat; echo out; echo err >&2; exit 42"});
@@ -53,11 +53,11 @@ TEST_F(Exec, TheCommandsStreamsAndStatusAreItsOwn) {
   EXPECT_EQ(result.status, 42);
 }
 
-TEST_F(Exec, ASignalThatEndsTheCommandIsSeenAsSuch) {
+TEST_F(Exec, CallerSeesTheSignalThatEndsTheCommand) {
   EXPECT_EQ(exec({"web", "--", "/bin/sh", "-c", "kill -TERM $$"}).signal, SIGTERM);
 }
 
-TEST_F(Exec, NoProcessStaysInBetween) {
+TEST_F(Exec, CommandHasTheProcessIdOfPoolctlExec) {
   const ProcessResult result =
       world.run("/bin/sh", {"-c", "echo $$; exec poolctl-exec web -- /bin/sh -c 'echo $$'"});
   const std::vector<std::string> pids = lines(result.out);
@@ -65,14 +65,14 @@ TEST_F(Exec, NoProcessStaysInBetween) {
   EXPECT_EQ(pids[0], pids[1]);
 }
 
-TEST_F(Exec, WhileTheCommandLivesItsPoolIsBusy) {
+TEST_F(Exec, PoolIsBusyWhileTheCommandRuns) {
   const ProcessResult result = exec({"web", "--", "/bin/sh", "-c", "poolctl disable host/opt/web"});
   EXPECT_EQ(result.status, 1);
   EXPECT_THAT(result.err, HasSubstr("busy"));
   EXPECT_EQ(world.poolctl({"disable", "host/opt/web"}).status, 0);
 }
 
-TEST_F(Exec, ANameStandsForAGroupBelowHostOptAndAPathForItself) {
+TEST_F(Exec, NameIsBelowHostOptAndPathIsTakenWhole) {
   EXPECT_EQ(exec({"host/opt/web", "--", "true"}).status, 0);
   EXPECT_EQ(exec({"parent/below", "--", "true"}).status, 0);
   EXPECT_EQ(exec({"host/infra", "--", "true"}).status, 0);
@@ -81,20 +81,20 @@ TEST_F(Exec, ANameStandsForAGroupBelowHostOptAndAPathForItself) {
   expectOwnFailure({"host", "--", "true"}, "poolctl-exec: host/opt/host: no such pool is loaded\n");
 }
 
-TEST_F(Exec, ArgumentsBehindTheSeparatorArePassedOnAsTheyStand) {
+TEST_F(Exec, ArgumentsAfterTheSeparatorAreUnchanged) {
   const ProcessResult result = exec(
       {"web", "--", "printf", "<%s>", "--help", "--", "", "[a,b]", "-x", "two words", "$HOME"});
   EXPECT_EQ(result.out, "<--help><--><><[a,b]><-x><two words><$HOME>");
 }
 
-TEST_F(Exec, ACommandWithoutASlashIsLookedForInPath) {
+TEST_F(Exec, CommandWithoutSlashIsSearchedInPath) {
   const auto path = script("#!/bin/sh\necho found\n", 0755);
   EXPECT_EQ(exec({"web", "--", "pool-script"}).status, 127);
   world.environment["PATH"] += ":" + world.folder().string();
   EXPECT_EQ(exec({"web", "--", "pool-script"}).out, "found\n");
 }
 
-TEST_F(Exec, ACommandThatIsNotFoundEndsWith127) {
+TEST_F(Exec, CommandThatIsNotFoundExitsWith127) {
   const ProcessResult result = exec({"web", "--", "no-such-command"});
   EXPECT_EQ(result.status, 127);
   EXPECT_EQ(result.err, "poolctl-exec: no-such-command: No such file or directory\n");
@@ -102,7 +102,7 @@ TEST_F(Exec, ACommandThatIsNotFoundEndsWith127) {
   EXPECT_EQ(exec({"web", "--", ""}).status, 127);
 }
 
-TEST_F(Exec, ACommandThatCannotBeRunEndsWith126) {
+TEST_F(Exec, CommandThatCannotBeExecutedExitsWith126) {
   const auto path = script("no program", 0644).string();
   const ProcessResult result = exec({"web", "--", path});
   EXPECT_EQ(result.status, 126);
@@ -110,7 +110,7 @@ TEST_F(Exec, ACommandThatCannotBeRunEndsWith126) {
   EXPECT_EQ(exec({"web", "--", "/"}).status, 126);
 }
 
-TEST_F(Exec, APoolThatIsNotLoadedIsSaidSoAndNothingIsRun) {
+TEST_F(Exec, PoolThatIsNotLoadedRunsNothing) {
   expectOwnFailure({"none", "--", "/bin/sh", "-c", "echo ran"},
                    "poolctl-exec: host/opt/none: no such pool is loaded\n");
   expectOwnFailure({"", "--", "true"}, "poolctl-exec: host/opt/: no such pool is loaded\n");
@@ -118,23 +118,23 @@ TEST_F(Exec, APoolThatIsNotLoadedIsSaidSoAndNothingIsRun) {
                    "poolctl-exec: host/../web: no such pool is loaded\n");
 }
 
-TEST_F(Exec, APoolWithPoolsBelowTakesNoProcesses) {
+TEST_F(Exec, PoolWithPoolsBelowRunsNothing) {
   expectOwnFailure({"parent", "--", "/bin/sh", "-c", "echo ran"},
                    "poolctl-exec: host/opt/parent: the pool has pools below it, so it takes no "
                    "processes itself\n");
 }
 
-TEST_F(Exec, ADisabledPoolTakesNoProcesses) {
+TEST_F(Exec, DisabledPoolRunsNothing) {
   ASSERT_EQ(world.poolctl({"disable", "-n", "host/opt/web"}).status, 0);
   expectOwnFailure({"web", "--", "/bin/sh", "-c", "echo ran"},
                    "poolctl-exec: host/opt/web: the pool is disabled\n");
 }
 
-TEST_F(Exec, NorDoesOneBelowADisabledPool) {
+TEST_F(Exec, PoolBelowADisabledOneRunsNothing) {
   ASSERT_EQ(world.poolctl({"disable", "-n", "host/opt/parent"}).status, 0);
   expectOwnFailure(
       {"parent/below", "--", "/bin/sh", "-c", "echo ran"},
-      "poolctl-exec: host/opt/parent/below: disabled: host/opt/parent may have no memory\n");
+      "poolctl-exec: host/opt/parent/below: disabled: host/opt/parent has no memory\n");
 }
 
 TEST_F(Exec, AKernelThatIsNotUsableIsReportedWithTheReason) {
@@ -145,7 +145,7 @@ TEST_F(Exec, AKernelThatIsNotUsableIsReportedWithTheReason) {
                        ":1: kernel: bad value \"none\" (one of: emulated, linux)\n");
 }
 
-TEST_F(Exec, WrongUsageEndsWith125) {
+TEST_F(Exec, WrongUsageExitsWith125) {
   for (const Arguments &arguments :
        {Arguments{}, Arguments{"web"}, Arguments{"web", "--"}, Arguments{"--", "true"},
         Arguments{"web", "true"}, Arguments{"web", "other", "--", "true"},
@@ -157,23 +157,29 @@ TEST_F(Exec, WrongUsageEndsWith125) {
   }
 }
 
-TEST_F(Exec, HelpIsPrintedAndIsNoFailure) {
+TEST_F(Exec, HelpIsPrintedAndSucceeds) {
   const ProcessResult result = exec({"--help"});
   EXPECT_EQ(result.status, 0);
   EXPECT_THAT(result.out, HasSubstr("Usage: poolctl-exec [OPTIONS] POOL -- COMMAND"));
-  EXPECT_THAT(result.out, HasSubstr("127 there is no such command"));
+  EXPECT_THAT(result.out, HasSubstr("127 it was not found"));
   EXPECT_EQ(result.err, "");
 }
 
-// The program opens the kernel's state; the command must not inherit it.
-TEST_F(Exec, TheCommandInheritsNoOpenFileOfTheLibrary) {
+TEST_F(Exec, VersionIsPrintedAndSucceeds) {
+  const ProcessResult result = exec({"--version"});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_THAT(result.out, testing::MatchesRegex("poolctl-exec \\(poolctl\\) [0-9]+\\.[0-9.]+\n"));
+}
+
+// libknob opens the kernel's state file; the command must not inherit the descriptor.
+TEST_F(Exec, CommandInheritsNoFileOfTheLibrary) {
   const std::string command = "ls -l /proc/self/fd";
   const std::string with = exec({"web", "--", "/bin/sh", "-c", command}).out;
   EXPECT_THAT(with, Not(HasSubstr("kernel.db")));
   EXPECT_EQ(lines(with).size(), lines(world.run("/bin/sh", {"-c", command}).out).size());
 }
 
-TEST_F(Exec, SignalsReachTheCommandAsTheyWouldWithoutThePool) {
+TEST_F(Exec, CommandHasTheCallersSignalMasks) {
   const std::string command = "grep Sig /proc/self/status";
   const auto masks = [](const std::string &out) {
     return std::regex_replace(out, std::regex("SigQ.*\n"), "");

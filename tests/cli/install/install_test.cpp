@@ -11,17 +11,19 @@
 #include <thread>
 #include <vector>
 
-#include "temp_folder.h"
-#include "world.h"
+#include "install_fixture.h"
 
 namespace {
 
 using ::Test::Arguments;
+using ::Test::entriesOf;
+using ::Test::kBad;
+using ::Test::kGood;
+using ::Test::kOther;
 using ::Test::lines;
 using ::Test::ProcessResult;
 using ::Test::readFile;
 using ::Test::setInstalledMark;
-using ::Test::World;
 using ::Test::writeFile;
 using testing::ElementsAre;
 using testing::HasSubstr;
@@ -29,10 +31,6 @@ using testing::IsEmpty;
 using testing::StartsWith;
 using testing::UnorderedElementsAre;
 namespace fs = std::filesystem;
-
-constexpr const char *kGood = "- name: a\n  memMin: 16\n";
-constexpr const char *kOther = "- name: b\n  memMin: 32\n";
-constexpr const char *kBad = "- name: a\n  memMinimum: 16\n";
 
 // A file whose content is a definition without pools, in a file system without user attributes.
 constexpr const char *kUnmarkable = "/proc/self/comm";
@@ -50,37 +48,7 @@ unsigned modeOf(const fs::path &path) {
   return static_cast<unsigned>(fs::status(path).permissions());
 }
 
-std::vector<std::string> entriesOf(const fs::path &folder) {
-  std::vector<std::string> names;
-  for (const auto &entry : fs::directory_iterator(folder))
-    names.push_back(entry.path().filename().string());
-  return names;
-}
-
-class Install : public testing::Test {
- protected:
-  void SetUp() override { SKIP_WITHOUT_PRIVATE_ETC(); }
-
-  // A file of the user's own, without a mark.
-  std::string source(const std::string &name, std::string_view yaml) {
-    const fs::path path = world.folder() / name;
-    writeFile(path, yaml);
-    return path.string();
-  }
-
-  ProcessResult install(const Arguments &arguments) {
-    (void)world.etc();
-    return world.run("poolctl-install", arguments);
-  }
-
-  void expectRefusal(const ProcessResult &result, const std::string &message, int status = 1) {
-    EXPECT_EQ(result.status, status);
-    EXPECT_EQ(result.out, "");
-    EXPECT_EQ(result.err, "poolctl-install: " + message + "\n");
-  }
-
-  World world;
-};
+using Install = ::Test::InstallFixture;
 
 TEST_F(Install, FileIsCopiedMarkedAndReadableForAll) {
   const std::string path = source("a.yaml", kGood);
@@ -96,23 +64,23 @@ TEST_F(Install, FileIsCopiedMarkedAndReadableForAll) {
   EXPECT_THAT(world.poolctl({"list", "-v"}).out, HasSubstr("\nhost/opt/a,yes,16,"));
 }
 
-TEST_F(Install, TheUsersOwnFileGetsNoMark) {
+TEST_F(Install, UsersOwnFileGetsNoMark) {
   const std::string path = source("a.yaml", kGood);
   install({path});
   EXPECT_EQ(markOf(path), "none");
 }
 
-TEST_F(Install, MissingFolderIsMadeForAllToRead) {
+TEST_F(Install, MissingFolderIsCreatedReadableForAll) {
   ASSERT_EQ(install({source("a.yaml", kGood)}).status, 0);
   EXPECT_EQ(modeOf(world.etc() / "rp.d"), 0755u);
 }
 
-TEST_F(Install, RefusalLeavesNoFolderThatWasNotThere) {
+TEST_F(Install, RefusalLeavesNoNewFolder) {
   EXPECT_EQ(install({source("a.yaml", kBad)}).status, 1);
   EXPECT_FALSE(fs::exists(world.etc() / "rp.d"));
 }
 
-TEST_F(Install, BadDefinitionIsRefusedWithTheLoadersMessageForTheUsersFile) {
+TEST_F(Install, BadDefinitionIsRefusedWithTheLoadersMessage) {
   world.rpD();
   const std::string path = source("a.yaml", kBad);
   expectRefusal(install({path}), path + ": line 2 column 3: invalid rp field");
@@ -126,7 +94,7 @@ TEST_F(Install, BrokenYamlIsRefused) {
   EXPECT_THAT(result.err, StartsWith("poolctl-install: " + path + ": line "));
 }
 
-TEST_F(Install, EmptyFileIsADefinitionWithoutPools) {
+TEST_F(Install, EmptyFileDeclaresNoPools) {
   EXPECT_EQ(install({source("a.yaml", "")}).status, 0);
   EXPECT_EQ(world.poolctl({"list"}).status, 0);
 }
@@ -136,9 +104,9 @@ TEST_F(Install, MissingFileIsNamed) {
   expectRefusal(install({path}), path + ": No such file or directory", 3);
 }
 
-TEST_F(Install, FolderIsNoDefinition) {
+TEST_F(Install, FolderIsRefused) {
   const std::string path = world.folder().string();
-  expectRefusal(install({path}), path + ": Is a directory");
+  expectRefusal(install({path}), path + ": not a regular file");
 }
 
 TEST_F(Install, OneBadFileOfSeveralInstallsNone) {
@@ -155,19 +123,19 @@ TEST_F(Install, FileOfTheSameNameIsReplaced) {
   EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("a.yaml"));
 }
 
-TEST_F(Install, InstalledFileCanBeInstalledAgainFromItsOwnPlace) {
+TEST_F(Install, InstalledFileCanBeInstalledAgain) {
   install({source("a.yaml", kGood)});
   EXPECT_EQ(install({"/etc/rp.d/a.yaml"}).status, 0);
   EXPECT_EQ(readFile(world.rpD() / "a.yaml"), kGood);
 }
 
-TEST_F(Install, FailureAtALaterFileTakesANewOneAway) {
+TEST_F(Install, FailureAtALaterFileRemovesANewOne) {
   fs::create_directories(world.rpD() / "b.yaml" / "inside");
   EXPECT_EQ(install({source("a.yaml", kGood), source("b.yaml", kOther)}).status, 1);
   EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("b.yaml"));
 }
 
-TEST_F(Install, FailureAtALaterFilePutsAReplacedOneBack) {
+TEST_F(Install, FailureAtALaterFileRestoresAReplacedOne) {
   install({source("a.yaml", kGood)});
   fs::create_directories(world.rpD() / "b.yaml" / "inside");
   EXPECT_EQ(install({source("a.yaml", kOther), source("b.yaml", kOther)}).status, 1);
@@ -176,19 +144,19 @@ TEST_F(Install, FailureAtALaterFilePutsAReplacedOneBack) {
   EXPECT_THAT(entriesOf(world.rpD()), UnorderedElementsAre("a.yaml", "b.yaml"));
 }
 
-TEST_F(Install, NameThatNoScanWouldReadIsRefused) {
+TEST_F(Install, HiddenNameIsRefused) {
   const std::string path = source(".a.yaml", kGood);
-  expectRefusal(install({path}), "'" + path + "': no name for an installed file", 2);
+  expectRefusal(install({path}), "'" + path + "': not a name for an installed file", 2);
 }
 
-TEST_F(Install, TwoFilesOfOneNameAreRefused) {
+TEST_F(Install, TwoFilesWithOneNameAreRefused) {
   fs::create_directory(world.folder() / "other");
   const std::string first = source("a.yaml", kGood);
   const std::string second = source("other/a.yaml", kOther);
   expectRefusal(install({first, second}), second + ": another file of this name is given too", 2);
 }
 
-TEST_F(Install, ReadersSeeTheOldOrTheNewFileAndNeverAPart) {
+TEST_F(Install, ReadersSeeTheOldOrTheNewFileOnly) {
   const std::string first = source("a.yaml", kGood);
   fs::create_directory(world.folder() / "other");
   const std::string second = source("other/a.yaml", kOther);
@@ -205,7 +173,7 @@ TEST_F(Install, ReadersSeeTheOldOrTheNewFileAndNeverAPart) {
   installer.join();
 }
 
-TEST_F(Install, MarkIsSetWhereTheFileStands) {
+TEST_F(Install, MarkOptionMarksTheFileInPlace) {
   const std::string path = source("a.yaml", kGood);
   EXPECT_EQ(install({"--mark", path}).status, 0);
   EXPECT_EQ(markOf(path), "\x01");
@@ -213,7 +181,7 @@ TEST_F(Install, MarkIsSetWhereTheFileStands) {
   EXPECT_FALSE(fs::exists(world.etc() / "rp.d"));
 }
 
-TEST_F(Install, MarkOfAnotherValueBecomesTheMark) {
+TEST_F(Install, MarkWithAnotherValueIsReplaced) {
   const std::string path = source("a.yaml", kGood);
   setInstalledMark(path, "no");
   EXPECT_EQ(install({"--mark", path}).status, 0);
@@ -228,7 +196,7 @@ TEST_F(Install, BadFileIsNotMarked) {
   EXPECT_EQ(markOf(bad), "none");
 }
 
-TEST_F(Install, FileSystemWithoutAttributesIsNamedAndMarksAreTakenBack) {
+TEST_F(Install, FailingMarkIsExplainedAndOthersAreUndone) {
   const std::string fresh = source("a.yaml", kGood);
   const std::string old = source("b.yaml", kGood);
   setInstalledMark(old, "no");
@@ -242,41 +210,96 @@ TEST_F(Install, FileSystemWithoutAttributesIsNamedAndMarksAreTakenBack) {
   EXPECT_EQ(markOf(old), "no");
 }
 
-TEST_F(Install, RemoveTakesTheNamedFilesAway) {
+TEST_F(Install, RemoveRemovesTheNamedFilesOnly) {
   install({source("a.yaml", kGood), source("b.yaml", kOther), source("c.yaml", kGood)});
   EXPECT_EQ(install({"--remove", "a.yaml", "c.yaml"}).status, 0);
   EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("b.yaml"));
 }
 
-TEST_F(Install, RemoveOfANameThatIsNotThereRemovesNone) {
+TEST_F(Install, RemoveOfAMissingNameRemovesNone) {
   install({source("a.yaml", kGood)});
   expectRefusal(install({"--remove", "a.yaml", "b.yaml"}),
                 "/etc/rp.d/b.yaml: No such file or directory", 3);
   EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("a.yaml"));
 }
 
-TEST_F(Install, RemoveOfOneNameTwicePutsTheFileBack) {
+TEST_F(Install, RemoveOfOneNameTwiceRemovesNone) {
   install({source("a.yaml", kGood)});
   EXPECT_EQ(install({"--remove", "a.yaml", "a.yaml"}).status, 1);
   EXPECT_EQ(readFile(world.rpD() / "a.yaml"), kGood);
   EXPECT_EQ(markOf(world.rpD() / "a.yaml"), "\x01");
 }
 
-TEST_F(Install, RemoveTakesNoPathAndNoHiddenName) {
+TEST_F(Install, RemoveRefusesPathsAndHiddenNames) {
   install({source("a.yaml", kGood)});
   for (const char *name : {"./a.yaml", "/etc/rp.d/a.yaml", "../passwd", ".", "..", ".a", ""}) {
     expectRefusal(install({"--remove", name}),
-                  "'" + std::string(name) + "': no name for an installed file", 2);
+                  "'" + std::string(name) + "': not a name for an installed file", 2);
   }
 }
 
-TEST_F(Install, RemoveTakesRegularFilesOnly) {
+TEST_F(Install, RemoveRefusesASymbolicLink) {
   fs::create_symlink("/dev/null", world.rpD() / "link");
-  expectRefusal(install({"--remove", "link"}), "/etc/rp.d/link: is no regular file");
+  expectRefusal(install({"--remove", "link"}), "/etc/rp.d/link: not a regular file");
 }
 
 TEST_F(Install, RemoveWithoutAFolderFails) {
   expectRefusal(install({"--remove", "a.yaml"}), "/etc/rp.d: No such file or directory", 3);
+}
+
+TEST_F(Install, FifoIsRefusedWithoutWaiting) {
+  const std::string path = (world.folder() / "fifo.yaml").string();
+  ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
+  expectRefusal(install({path}), path + ": not a regular file");
+  expectRefusal(install({"--mark", path}), path + ": not a regular file");
+}
+
+TEST_F(Install, DeviceIsRefused) {
+  expectRefusal(install({"/dev/zero"}), "/dev/zero: not a regular file");
+}
+
+TEST_F(Install, FileLargerThan64MBIsRefused) {
+  const std::string path = source("a.yaml", "# ");
+  fs::resize_file(path, (64U << 20U) + 1);
+  expectRefusal(install({path}),
+                path + ": larger than 64 MB, the most that a definition file may have");
+  EXPECT_FALSE(fs::exists(world.etc() / "rp.d"));
+}
+
+TEST_F(Install, MoreFilesThanAProcessMayHaveOpenAreInstalled) {
+  Arguments paths{"64", "poolctl-install"};
+  for (int i = 0; i < 100; ++i) {
+    const std::string number = std::to_string(i);
+    paths.push_back(source("f" + number + ".yaml", "- name: p" + number + "\n  memMin: 1\n"));
+  }
+  (void)world.etc();
+  const auto limited = [&](const Arguments &arguments) {
+    Arguments all{"-c", "ulimit -n $0; exec \"$@\""};
+    all.insert(all.end(), arguments.begin(), arguments.end());
+    return world.run("/bin/sh", all);
+  };
+  const ProcessResult installed = limited(paths);
+  EXPECT_EQ(installed.status, 0) << installed.err;
+  EXPECT_EQ(entriesOf(world.rpD()).size(), 100U);
+  paths.insert(paths.begin() + 2, "--mark");
+  EXPECT_EQ(limited(paths).status, 0);
+  EXPECT_EQ(markOf(paths.back()), "\x01");
+}
+
+TEST_F(Install, FolderThatOthersMayChangeIsNamedInAWarning) {
+  fs::permissions(world.rpD(), fs::perms::others_write, fs::perm_options::add);
+  const ProcessResult result = install({source("a.yaml", kGood)});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_EQ(result.err,
+            "poolctl-install: warning: /etc/rp.d: other users may change the definition files in "
+            "it\n");
+}
+
+TEST_F(Install, VersionGoesToStandardOutput) {
+  const ProcessResult result = install({"--version"});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_THAT(result.out,
+              testing::MatchesRegex("poolctl-install \\(poolctl\\) [0-9]+\\.[0-9.]+\n"));
 }
 
 TEST_F(Install, HelpGoesToStandardOutput) {
@@ -287,7 +310,7 @@ TEST_F(Install, HelpGoesToStandardOutput) {
     EXPECT_THAT(result.out, HasSubstr(word));
 }
 
-TEST_F(Install, WrongUsageHasAStatusOfItsOwn) {
+TEST_F(Install, WrongUsageExitsWith2AndChangesNothing) {
   const std::string path = source("a.yaml", kGood);
   for (const Arguments &arguments :
        {Arguments{}, {"--mark"}, {"--mark", "--remove", path}, {"--frob", path}}) {

@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// Preloaded into a program under test: writes down what it sends to the system log, which it still
-// sends, and gives it a clock of its own, in which sleeping takes no time at all. The clock starts
-// at the second that HOST_CALLS_TIME names and moves only by what the program sleeps. The file that
-// HOST_CALLS_UNREADABLE names cannot be opened, not even by root. What is flushed to
-// standard output is written down with its size.
+// Preloaded into a program under test. Records what the program sends to the system log, and sends
+// it too. Gives the program its own clock, which starts at the second HOST_CALLS_TIME and advances
+// only when the program sleeps; a sleep takes no time. The file that HOST_CALLS_UNREADABLE names
+// cannot be opened, not even by root. Records the size of what is flushed to standard output.
 #include <dlfcn.h>
 #include <stdio_ext.h>
 #include <syslog.h>
@@ -122,7 +121,7 @@ int nanosleep(const timespec *length, timespec *) {
 }
 
 int clock_nanosleep(clockid_t, int flags, const timespec *length, timespec *) {
-  if (flags != 0) abort();  // an absolute time of another clock than this one
+  if (flags != 0) abort();  // an absolute time is not supported
   pass(nanosecondsOf(*length));
   return 0;
 }
@@ -137,7 +136,7 @@ FILE *fopen(const char *path, const char *mode) {
   return opened("fopen", path, mode);
 }
 
-// What the C++ library's file streams open their files with.
+// The C++ library's file streams use it.
 FILE *fopen64(const char *path, const char *mode) {
   return opened("fopen64", path, mode);
 }

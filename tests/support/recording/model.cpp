@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reading of the script, and the few answers that depend on the groups.
+// Reads the script, and computes the results that depend on the groups.
 #include "model.h"
 
 #include <algorithm>

@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The groups and facts that the recording libknob answers with: plain values in memory, read from
-// a script and written out at the end. It admits every reservation; what must be refused, the
-// script's rules refuse.
+// The groups and facts of the recording libknob: plain values in memory, read from a script and
+// written out at the end. The model accepts every reservation; only rules of the script refuse one.
 #pragma once
 
 #include <cstdint>
@@ -28,10 +27,10 @@ struct Group {
   std::string path;
   Allocation memory, cpu;
   uint64_t ownPeakKB = 0, childrenPeakKB = 0;
-  int emptiesAfter = -1;  // its child groups vanish after so many looks at them; -1: never
+  int emptiesAfter = -1;  // its child groups vanish after so many listings; -1: never
 };
 
-// A rule of the script: the calls that match it fail. What is empty matches everything.
+// A rule of the script: the calls that match it fail. An empty field matches everything.
 struct Rule {
   std::string function, node, group;
   uint32_t status = 0;
@@ -56,8 +55,8 @@ struct Model {
 
   Model();
 
-  // Reads the lines of a script (see README.md beside this file); throws on one that it doesn't
-  // know.
+  // Reads the lines of a script (see README.md in this folder). Throws std::runtime_error on an
+  // unknown one.
   void read(std::istream &script);
   void writeGroups(std::ostream &out) const;
 

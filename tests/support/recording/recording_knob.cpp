@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// A libknob for tests: it writes down every call, answers from a small model that a script fills,
-// fails the calls that the script names, and watches the parameter lists. README.md beside this
-// file describes its files.
+// A libknob for tests: it records every call, returns values of a small model that a script fills,
+// fails the calls that the script names, and checks the use of parameter lists. README.md in this
+// folder describes its files.
 #include "recording_knob.h"
 
 #include <algorithm>
@@ -19,13 +19,13 @@
 using Recording::formatted;
 using Recording::quoted;
 
-// A destroyed list is kept, so that its further use is seen.
+// A destroyed list is kept, so that a later use of it is noticed.
 struct KNOB_ParamList {
   int number = 0;
   int kind = 0;
   int capacity = 0;
   bool destroyed = false;
-  std::vector<std::string> entries;  // as they are written down: numbers plain, texts quoted
+  std::vector<std::string> entries;  // as in the trace: numbers plain, texts quoted
   std::vector<std::string> texts;
   std::vector<int64_t> numbers;
 };
@@ -34,7 +34,7 @@ namespace {
 
 constexpr uint32_t kBadNode = 0x0BAD00F1;
 
-// Numbers that no other libknob is likely to have: a program may only pass them on.
+// Numbers that no other libknob is likely to have: programs must not know them.
 constexpr KNOB_NodeID kFirstNode = 1001;
 
 constexpr const char *kNodeNames[] = {"hardware_cpu_cpuInfo",
@@ -61,7 +61,7 @@ void write(const std::string &line) {
   Recording::record("RECORDING_KNOB_TRACE", line);
 }
 
-// Never destroyed at the program's end: its own exit handlers may still call.
+// Not destroyed at the end of the program, because its exit handlers may still call.
 State *current = nullptr;
 
 State &state() {
@@ -150,7 +150,7 @@ uint32_t add(KNOB_ParamList *list, const char *function, const std::string &entr
   return status;
 }
 
-// One KNOB_Get, KNOB_Set or KNOB_GetInstanceListAlloc while it is answered.
+// The arguments of one KNOB_Get, KNOB_Set or KNOB_GetInstanceListAlloc.
 struct Call {
   const char *function;
   KNOB_NodeID node;
@@ -195,7 +195,7 @@ void put(const Call &call, const T &value) {
   memcpy(call.output, &value, sizeof value);
 }
 
-// Writes a record. The bytes that have no meaning hold a value that would be noticed.
+// Writes a record. Bytes that have no meaning get a value that a program would notice.
 template <typename Record, typename SetMembers>
 uint32_t putRecord(const Call &call, const SetMembers &setMembers) {
   if (!call.outputIs(sizeof(Record))) return Recording::kBadParameter;
@@ -240,7 +240,7 @@ uint32_t getFact(const Call &call) {
   return kBadNode;
 }
 
-uint32_t answerGet(const Call &call) {
+uint32_t executeGet(const Call &call) {
   if (call.node <= KNOB_NODE_memory_comprehensive) {
     if (call.instance != nullptr) write("MISUSE a fact of the machine has no instance");
     return getFact(call);
@@ -260,7 +260,7 @@ uint32_t answerGet(const Call &call) {
   return kBadNode;
 }
 
-uint32_t answerSet(const Call &call) {
+uint32_t executeSet(const Call &call) {
   Recording::Model &model = state().model;
   Recording::Group *group = call.group();
   int64_t id = 0;
@@ -288,13 +288,13 @@ uint32_t answerSet(const Call &call) {
   return kBadNode;
 }
 
-uint32_t answered(const Call &call, uint32_t (*answer)(const Call &)) {
+uint32_t executed(const Call &call, uint32_t (*execute)(const Call &)) {
   call.checkLists();
   const std::string node = nodeName(call.node);
-  // Before the answer: a deleted group has no path any more.
+  // Before the call is executed: a deleted group has no path any more.
   uint32_t status = injected(call.function, node, call.groupPath());
   const bool wasInjected = status != 0;
-  if (!wasInjected) status = answer(call);
+  if (!wasInjected) status = execute(call);
   std::string line =
       formatted("%s %s instance=%s", call.function, node.c_str(), shown(call.instance).c_str());
   if (strcmp(call.function, "KNOB_Set") == 0) line += " input=" + shown(call.input);
@@ -377,17 +377,17 @@ int KNOB_ParamListNumInstances(const KNOB_ParamList *list) {
 
 KNOB_ReturnStatus KNOB_Get(KNOB_NodeID node, const KNOB_ParamList *instance, void *output,
                            size_t outputSize) {
-  return answered({"KNOB_Get", node, instance, nullptr, output, outputSize}, answerGet);
+  return executed({"KNOB_Get", node, instance, nullptr, output, outputSize}, executeGet);
 }
 
 KNOB_ReturnStatus KNOB_Set(KNOB_NodeID node, const KNOB_ParamList *instance,
                            const KNOB_ParamList *input, void *output, size_t outputSize) {
-  return answered({"KNOB_Set", node, instance, input, output, outputSize}, answerSet);
+  return executed({"KNOB_Set", node, instance, input, output, outputSize}, executeSet);
 }
 
 KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamList *instance,
                                             KNOB_ParamList **list) {
-  const auto answer = [](const Call &call) -> uint32_t {
+  const auto execute = [](const Call &call) -> uint32_t {
     Recording::Model &model = state().model;
     Recording::Group *group = call.group();
     if (group == nullptr) return Recording::kNotFound;
@@ -404,7 +404,7 @@ KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamLi
     return 0;
   };
   const Call call{"KNOB_GetInstanceListAlloc", node, instance, nullptr, list, 0};
-  const uint32_t status = answered(call, answer);
+  const uint32_t status = executed(call, execute);
   if (status == 0) write(formatted("  handed out #%d", (*list)->number));
   return status;
 }

@@ -1,13 +1,13 @@
 /* SPDX-License-Identifier: Apache-2.0 */
-/* For a test that is linked against the recording libknob instead of running a program with it. */
+/* For a test that is itself linked with the recording libknob. */
 #pragma once
 
 #ifdef __cplusplus
 extern "C" {
 #endif
 
-/* Writes down what a program's end would (lists that are left over, the groups, END), and forgets
-   everything: the next call reads the script that the environment then names. */
+/* Does what happens at the end of a program (records left-over lists, the groups and END), and
+   clears all state. The next call reads the script that the environment then names. */
 void RecordingKnobEnd(void);
 
 #ifdef __cplusplus

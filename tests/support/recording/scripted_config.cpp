@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// A libkestrelconfig for tests: it writes down every lookup and answers it from a script, with
-// values, with nothing, or with an exception. README.md beside this file describes its files.
+// A libkestrelconfig for tests: it records every lookup and takes the result from a script: a
+// value, nothing, or an exception. README.md in this folder describes its files.
 #include <cstdlib>
 #include <fstream>
 #include <iostream>
@@ -20,18 +20,18 @@ void write(const std::string &line) {
   Recording::record("SCRIPTED_CONFIG_TRACE", line);
 }
 
-struct Answer {
+struct Result {
   std::string kind, text;  // integer, real, text, or an exception and its message
 };
 
-void throwIfAsked(const Answer &answer) {
-  if (answer.kind == "ConfigStoreException") throw ConfigStoreException(answer.text);
-  if (answer.kind == "InvalidTypeException") throw InvalidTypeException(answer.text);
-  if (answer.kind == "runtime_error") throw std::runtime_error(answer.text);
+void throwIfAsked(const Result &result) {
+  if (result.kind == "ConfigStoreException") throw ConfigStoreException(result.text);
+  if (result.kind == "InvalidTypeException") throw InvalidTypeException(result.text);
+  if (result.kind == "runtime_error") throw std::runtime_error(result.text);
 }
 
-// What is scripted, by "store", "object ID" and "field ID NAME".
-using Script = std::map<std::string, Answer>;
+// The scripted results, by "store", "object ID" and "field ID NAME".
+using Script = std::map<std::string, Result>;
 
 const Script &script() {
   static const Script only = [] {
@@ -46,17 +46,17 @@ const Script &script() {
         abort();
       }
       std::istringstream words(line.substr(sign + 3));
-      Answer answer;
-      words >> answer.kind;
-      std::getline(words >> std::ws, answer.text);
-      made[line.substr(0, sign)] = answer;
+      Result result;
+      words >> result.kind;
+      std::getline(words >> std::ws, result.text);
+      made[line.substr(0, sign)] = result;
     }
     return made;
   }();
   return only;
 }
 
-const Answer *scripted(const std::string &what) {
+const Result *scripted(const std::string &what) {
   const auto found = script().find(what);
   return found == script().end() ? nullptr : &found->second;
 }
@@ -66,27 +66,27 @@ class ScriptedObject : public StoreObject {
   explicit ScriptedObject(std::string id) : id_(std::move(id)) {}
 
   bool GetValue(const char *field, long *value) const override {
-    const Answer *answer = read("long", field);
-    if (answer == nullptr) return false;
-    if (answer->kind != "integer") throw InvalidTypeException("no integer");
-    *value = std::stol(answer->text);
+    const Result *result = read("long", field);
+    if (result == nullptr) return false;
+    if (result->kind != "integer") throw InvalidTypeException("no integer");
+    *value = std::stol(result->text);
     return true;
   }
 
   bool GetValue(const char *field, double *value) const override {
-    const Answer *answer = read("double", field);
-    if (answer == nullptr) return false;
-    if (answer->kind == "text") throw InvalidTypeException("no number");
-    *value = std::stod(answer->text);
+    const Result *result = read("double", field);
+    if (result == nullptr) return false;
+    if (result->kind == "text") throw InvalidTypeException("no number");
+    *value = std::stod(result->text);
     return true;
   }
 
  private:
-  const Answer *read(const char *type, const char *field) const {
+  const Result *read(const char *type, const char *field) const {
     write(std::string("GetValue ") + type + " " + quoted(field));
-    const Answer *answer = scripted("field " + id_ + " " + field);
-    if (answer != nullptr) throwIfAsked(*answer);
-    return answer;
+    const Result *result = scripted("field " + id_ + " " + field);
+    if (result != nullptr) throwIfAsked(*result);
+    return result;
   }
 
   const std::string id_;
@@ -98,9 +98,9 @@ class ScriptedStore : public ConfigStore {
     write("GetObject key=" + quoted(id.key) + " component=" + quoted(id.component) +
           " group=" + quoted(id.group) + " extra=" + quoted(id.extra));
     const std::string whole = id.component + "/" + id.group + "/" + id.key;
-    const Answer *answer = scripted("object " + whole);
-    if (answer == nullptr) return nullptr;
-    throwIfAsked(*answer);
+    const Result *result = scripted("object " + whole);
+    if (result == nullptr) return nullptr;
+    throwIfAsked(*result);
     return std::make_shared<ScriptedObject>(whole);
   }
 };
@@ -113,9 +113,9 @@ const std::string sGlobalNamespace = "scripted-global";
 
 std::shared_ptr<ConfigStore> ConfigStore::GetStore(const std::string &nameSpace) {
   write("GetStore " + quoted(nameSpace));
-  const Answer *answer = scripted("store");
-  if (answer == nullptr) return nullptr;
-  throwIfAsked(*answer);
+  const Result *result = scripted("store");
+  if (result == nullptr) return nullptr;
+  throwIfAsked(*result);
   return std::make_shared<ScriptedStore>();
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Each line is written by one call, so that a program that dies leaves every line before.
+// Each line is written by one call, so that a program that dies leaves all earlier lines.
 #include "trace.h"
 
 #include <fcntl.h>

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The file in which a stand-in library writes down, one line each, the calls that it gets.
+// The file in which a stand-in library records its calls, one on each line.
 #pragma once
 
 #include <string>
@@ -9,7 +9,7 @@ namespace Recording {
 // Appends LINE to the file that the environment variable VARIABLE names; does nothing without it.
 void record(const char *variable, const std::string &line);
 
-// What FORMAT and its arguments make, as printf would.
+// FORMAT with its arguments inserted, as by printf.
 std::string formatted(const char *format, ...) __attribute__((format(printf, 1, 2)));
 
 // TEXT between double quotes, with line ends and quotes written as escapes.

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Opening directories below one directory, in both ways: with the system's own call, and part by
-// part. A plain folder shows all but what needs a cgroup.
+// Opening directories below one directory, in both ways: with one system call, and component by
+// component. A plain folder is enough for all that needs no cgroup.
 #include "knob/linux/beneath.h"
 
 #include <fcntl.h>
@@ -39,7 +39,7 @@ class Beneath : public testing::TestWithParam<Open> {
   UniqueFd start_, opened_;
 };
 
-INSTANTIATE_TEST_SUITE_P(InBothWays, Beneath, testing::Values(openBeneath, openPartByPart));
+INSTANTIATE_TEST_SUITE_P(InBothWays, Beneath, testing::Values(openBeneath, openByComponents));
 
 TEST_P(Beneath, ADirectoryIsOpenedAtAnyDepth) {
   for (const char *path : {"a", "a/b", "a/b/c"}) {
@@ -51,25 +51,25 @@ TEST_P(Beneath, ADirectoryIsOpenedAtAnyDepth) {
   }
 }
 
-TEST_P(Beneath, WhatIsMissingIsNotThere) {
+TEST_P(Beneath, AMissingDirectoryIsNotFound) {
   EXPECT_EQ(open("x"), ENOENT);
   EXPECT_EQ(open("a/x/c"), ENOENT);
   EXPECT_EQ(open(""), ENOENT);
 }
 
-TEST_P(Beneath, AFileIsNoDirectory) {
+TEST_P(Beneath, AFileIsNotADirectory) {
   EXPECT_EQ(open("a/file"), ENOTDIR);
   EXPECT_EQ(open("a/file/x"), ENOTDIR);
 }
 
-TEST_P(Beneath, NoLinkIsFollowed) {
+TEST_P(Beneath, ALinkIsNotFollowed) {
   for (const char *path : {"a/link", "a/link/c", "a/root", "a/root/proc"}) {
     const int error = open(path);
     EXPECT_TRUE(error == ELOOP || error == ENOTDIR) << path << ": " << error;
   }
 }
 
-TEST_P(Beneath, NothingLeadsUpwardsAndOut) {
+TEST_P(Beneath, APathCannotLeadUpwards) {
   EXPECT_EQ(open(".."), EXDEV);
   EXPECT_EQ(open("a/../.."), EXDEV);
   EXPECT_EQ(open("a/b/../../../etc"), EXDEV);

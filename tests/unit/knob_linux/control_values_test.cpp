@@ -7,8 +7,8 @@
 namespace Knob::Linux {
 namespace {
 
-constexpr int64_t kMostInt64 = std::numeric_limits<int64_t>::max();
-constexpr int64_t kMostPercent = std::numeric_limits<int32_t>::max();
+constexpr int64_t kMaxInt64 = std::numeric_limits<int64_t>::max();
+constexpr int64_t kMaxPercent = std::numeric_limits<int32_t>::max();
 
 TEST(MemoryText, IsInBytes) {
   EXPECT_EQ(memoryText(0), "0");
@@ -20,23 +20,23 @@ TEST(MemoryText, NoLimitIsMax) {
   EXPECT_EQ(memoryText(-1), "max");
 }
 
-TEST(MemoryText, TheMostThatLinuxCountsIsANumberAndOneMoreIsMax) {
+TEST(MemoryText, TheLargestThatLinuxCountsIsANumberAndOneMoreIsMax) {
   EXPECT_EQ(memoryText((int64_t{1} << 43) - 1), "9223372036853727232");
   EXPECT_EQ(memoryText(int64_t{1} << 43), "max");
-  EXPECT_EQ(memoryText(kMostInt64), "max");
+  EXPECT_EQ(memoryText(kMaxInt64), "max");
 }
 
 TEST(CpuMaxText, IsAQuotaOfATenthOfASecond) {
   EXPECT_EQ(cpuMaxText(100), "100000 100000");
   EXPECT_EQ(cpuMaxText(350), "350000 100000");
-  EXPECT_EQ(cpuMaxText(kMostPercent), "2147483647000 100000");
+  EXPECT_EQ(cpuMaxText(kMaxPercent), "2147483647000 100000");
 }
 
 TEST(CpuMaxText, NoLimitIsMax) {
   EXPECT_EQ(cpuMaxText(-1), "max 100000");
 }
 
-TEST(CpuMaxText, NothingIsTheLeastThatLinuxTakes) {
+TEST(CpuMaxText, ZeroIsTheSmallestQuotaOfLinux) {
   EXPECT_EQ(cpuMaxText(0), "1000 100000");
   EXPECT_EQ(cpuMaxText(1), "1000 100000");
   EXPECT_EQ(cpuMaxText(2), "2000 100000");
@@ -62,7 +62,7 @@ INSTANTIATE_TEST_SUITE_P(OfSharesAlone, CpuWeight,
                                          WeightCase{20, 0, 4, 2}, WeightCase{29, 0, 4, 2},
                                          WeightCase{1000, 0, 4, 100}, WeightCase{99999, 0, 4, 9999},
                                          WeightCase{100000, 0, 4, 10000},
-                                         WeightCase{kMostInt64, 0, 4, 10000}));
+                                         WeightCase{kMaxInt64, 0, 4, 10000}));
 INSTANTIATE_TEST_SUITE_P(OfReservations, CpuWeight,
                          testing::Values(WeightCase{-3, 1, 1, 100}, WeightCase{-3, 2, 1, 200},
                                          WeightCase{-3, 75, 1, 7500}, WeightCase{0, 1, 3, 34},
@@ -70,7 +70,7 @@ INSTANTIATE_TEST_SUITE_P(OfReservations, CpuWeight,
                                          WeightCase{-3, 400, 4, 10000},
                                          WeightCase{-3, 401, 4, 10000}, WeightCase{-4, 4, 4, 200},
                                          WeightCase{-4, 9, 4, 225},
-                                         WeightCase{-3, kMostInt64, 4, 10000},
+                                         WeightCase{-3, kMaxInt64, 4, 10000},
                                          WeightCase{-3, 100, 0, 10000}));
 
 TEST(Shares, EveryWeightReadsBackAsSharesThatGiveIt) {

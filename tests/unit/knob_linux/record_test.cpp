@@ -7,7 +7,6 @@
 #include <cstring>
 #include <string>
 
-#include "knob/linux/bookkeeper.h"
 #include "knob/linux/control_values.h"
 
 namespace Knob::Linux {
@@ -26,7 +25,7 @@ std::string bytesOf(const Record &record) {
   return {bytes.data(), bytes.size()};
 }
 
-// The numbers stand behind version and flags, 8 bytes each.
+// The numbers follow version and flags, 8 bytes each.
 std::string withNumber(size_t index, int64_t number) {
   std::string bytes = bytesOf(sample());
   std::memcpy(bytes.data() + 8 + 8 * index, &number, sizeof(number));
@@ -56,9 +55,9 @@ TEST(Record, ANewGroupsReadsBackToo) {
 }
 
 TEST(Record, TheEndsOfEveryRangeReadBack) {
-  constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
+  constexpr int64_t kMax = std::numeric_limits<int64_t>::max();
   Record record;
-  record.memory = {{kMost, kMost, kMost, kMost}, kMost};
+  record.memory = {{kMax, kMax, kMax, kMax}, kMax};
   record.peaks = {kUnlimited, kUnlimited};
   record.savedHigh = kUnlimited;
   const auto again = decode(bytesOf(record));
@@ -67,7 +66,7 @@ TEST(Record, TheEndsOfEveryRangeReadBack) {
   EXPECT_EQ(again->savedHigh, kUnlimited);
 }
 
-TEST(Record, ASavedLimitOfNothingIsNotNoSavedLimit) {
+TEST(Record, ASavedLimitOf0IsNotMissing) {
   Record record = sample();
   record.savedHigh = 0;
   const auto again = decode(bytesOf(record));
@@ -90,13 +89,13 @@ TEST(Record, AnotherVersionIsDamaged) {
   }
 }
 
-TEST(Record, FlagsThatThisVersionHasNotAreDamaged) {
+TEST(Record, UnknownFlagsAreDamaged) {
   std::string bytes = bytesOf(sample());
   bytes[4] = 2;
   EXPECT_FALSE(decode(bytes));
 }
 
-TEST(Record, ValuesThatNoOperationLeavesBehindAreDamaged) {
+TEST(Record, ValuesThatNoOperationWritesAreDamaged) {
   EXPECT_FALSE(decode(withNumber(0, -1))) << "memory min";
   EXPECT_FALSE(decode(withNumber(0, 201))) << "memory min above max";
   EXPECT_FALSE(decode(withNumber(1, -2))) << "memory max";
@@ -107,16 +106,6 @@ TEST(Record, ValuesThatNoOperationLeavesBehindAreDamaged) {
   EXPECT_FALSE(decode(withNumber(8, -5))) << "CPU shares";
   EXPECT_FALSE(decode(withNumber(9, -1))) << "CPU sum";
   EXPECT_TRUE(decode(withNumber(4, 0)));
-}
-
-TEST(SaturatedSum, StopsAtTheMostInsteadOfTurningNegative) {
-  constexpr int64_t kMost = std::numeric_limits<int64_t>::max();
-  EXPECT_EQ(saturatedSum(3, 4), 7);
-  EXPECT_EQ(saturatedSum(-3, 4), 1);
-  EXPECT_EQ(saturatedSum(kMost - 1, 1), kMost);
-  EXPECT_EQ(saturatedSum(kMost, 1), kMost);
-  EXPECT_EQ(saturatedSum(kMost, kMost), kMost);
-  EXPECT_EQ(saturatedSum(kMost, 0), kMost);
 }
 
 }  // namespace

@@ -1,0 +1,14 @@
+// SPDX-License-Identifier: Apache-2.0
+// What --version prints.
+#pragma once
+
+#include <string>
+
+namespace Tools {
+
+// "NAME (poolctl) 1.2.3"
+inline std::string versionOf(const std::string &name) {
+  return name + " (poolctl) " POOLCTL_VERSION;
+}
+
+}  // namespace Tools
