@@ -112,7 +112,7 @@ Hogs::~Hogs() {
     waitpid(hog.pid, nullptr, 0);
     removeGroup(hog.group);
   }
-  removeGroup(top_);
+  rmdir(top_.c_str());
 }
 
 void Hogs::add(const char *name, const std::function<void()> &work) {

@@ -22,7 +22,7 @@ class Hogs {
   Hogs(const Hogs &) = delete;
   Hogs &operator=(const Hogs &) = delete;
 
-  // Kills them and removes their groups.
+  // Kills them, with all else that lives in their group, and removes their groups.
   ~Hogs();
 
   // Starts those anew that have ended. To be called again and again.

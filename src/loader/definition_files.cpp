@@ -23,6 +23,14 @@ struct CloseFolder {
   throw std::system_error(errno, std::generic_category(), kDefinitionFolder);
 }
 
+// Newer yaml libraries add the path, which the file error names already.
+std::string bareMessage(const YAML::Exception &error) {
+  if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
+  return error.msg;
+}
+
+}  // namespace
+
 // The listing's own type counts: links, folders and entries of unknown type are no definitions.
 std::vector<std::string> listDefinitionFolder() {
   const std::unique_ptr<DIR, CloseFolder> folder(opendir(kDefinitionFolder));
@@ -48,14 +56,6 @@ bool isInstalled(const std::string &path) {
   }
   return false;
 }
-
-// Newer yaml libraries add the path, which the file error names already.
-std::string bareMessage(const YAML::Exception &error) {
-  if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
-  return error.msg;
-}
-
-}  // namespace
 
 PoolList readFile(const std::string &path) {
   try {

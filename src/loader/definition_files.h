@@ -19,6 +19,13 @@ constexpr const char *kDefinitionFolder = "/etc/rp.d";
 // are tried: the first where the file system takes it, else the second. Its value is one byte, 1.
 constexpr const char *kInstalledMarks[] = {"orrery.installed", "user.orrery.installed"};
 
+// The paths of the folder's definition files, in no order. Throws std::system_error when the folder
+// cannot be read.
+std::vector<std::string> listDefinitionFolder();
+
+// Whether the file carries the installed mark. A file that does not exist carries none.
+bool isInstalled(const std::string &path);
+
 // The pools of the named files, or of every file of the definition folder when none is named,
 // sorted by name. Throws Loader::FileError, which names the file and holds its cause, or
 // std::system_error when the folder cannot be read.

@@ -3,7 +3,9 @@
 #include <gtest/gtest.h>
 
 #include <chrono>
+#include <memory>
 #include <thread>
+#include <vector>
 
 #include "linux_world.h"
 
@@ -36,7 +38,34 @@ void measure() {
   std::this_thread::sleep_for(std::chrono::seconds(6));
 }
 
-class Cpu : public LinuxTest {};
+// What the groups used of the time that passed in all of them, in percent.
+std::vector<double> partsOf(const std::vector<std::string> &groups) {
+  std::vector<Meter> meters;
+  for (const std::string &group : groups) meters.emplace_back(group);
+  measure();
+  std::vector<double> parts;
+  double sum = 0;
+  for (const Meter &meter : meters) sum += parts.emplace_back(meter.percent());
+  for (double &part : parts) part *= 100 / sum;
+  return parts;
+}
+
+class Cpu : public LinuxTest {
+ protected:
+  // A group of another program beside host.
+  static void makeSlice(const std::string &name, int weight) {
+    std::filesystem::create_directory(kMount / name);
+    writeControl("", "cgroup.subtree_control", "+memory +cpu");
+    writeControl(name, "cpu.weight", std::to_string(weight));
+  }
+
+  void addBusyProcess(const std::string &group) {
+    workers_.push_back(std::make_unique<Worker>(group, beBusy));
+  }
+
+ private:
+  std::vector<std::unique_ptr<Worker>> workers_;
+};
 
 TEST_F(Cpu, AMinimumOf75LeavesItsPoolAtLeast70PercentBesideABusyNeighbour) {
   ASSERT_TRUE(silentlyDone(load("- name: first\n  cpuMin: 75\n- name: other\n")));
@@ -82,6 +111,39 @@ TEST_F(Cpu, AMaximumOf20HoldsOnAMachineThatIsOtherwiseIdle) {
   const Meter capped("host/opt/capped");
   measure();
   EXPECT_NEAR(capped.percent(), 20.0, 3.0);
+}
+
+TEST_F(Cpu, AMinimumOf20TakesItsFairThirdBesideTwoBusySlices) {
+  makeSlice("a.slice", 100);
+  makeSlice("b.slice", 100);
+  ASSERT_TRUE(silentlyDone(load("- name: pool\n  cpuMin: 20\n")));
+  for (const char *group : {"host/opt/pool", "a.slice", "b.slice"}) addBusyProcess(group);
+  EXPECT_NEAR(partsOf({"host/opt/pool", "a.slice", "b.slice"})[0], 33.3, 3.0);
+}
+
+TEST_F(Cpu, AMinimumOf40IsKeptBesideAHeavySliceAndTakesLittleMore) {
+  makeSlice("heavy.slice", 1000);
+  ASSERT_TRUE(silentlyDone(load("- name: pool\n  cpuMin: 40\n")));
+  addBusyProcess("host/opt/pool");
+  for (int i = 0; i < 4; ++i) addBusyProcess("heavy.slice");
+  const double part = partsOf({"host/opt/pool", "heavy.slice"})[0];
+  EXPECT_GE(part, 40.0 - 1.0);
+  EXPECT_LE(part, 43.3 + 3.0);
+}
+
+TEST_F(Cpu, MinimaOf30And50AreKeptBesideTenSiblingsAndASlice) {
+  makeSlice("a.slice", 100);
+  std::string pools = "- name: small\n  cpuMin: 30\n- name: large\n  cpuMin: 50\n";
+  for (int i = 0; i < 10; ++i) pools += "- name: other" + std::to_string(i) + "\n";
+  ASSERT_TRUE(silentlyDone(load(pools)));
+  for (const char *group : {"host/opt/small", "host/opt/large", "a.slice"}) addBusyProcess(group);
+  for (int i = 0; i < 10; ++i) addBusyProcess("host/opt/other" + std::to_string(i));
+  const std::vector<double> parts =
+      partsOf({"host/opt/small", "host/opt/large", "host", "a.slice"});
+  const double machine = (parts[2] + parts[3]) / 100;
+  EXPECT_GE(parts[0] / machine, 30.0 - 1.0);
+  EXPECT_GE(parts[1] / machine, 50.0 - 1.0);
+  EXPECT_LE(parts[2] / machine, 81.3 + 3.0) << "host itself";
 }
 
 }  // namespace

@@ -2,10 +2,12 @@
 #include "expected_files.h"
 
 #include <algorithm>
+#include <set>
 #include <sstream>
 #include <vector>
 
 #include "control_files.h"
+#include "knob/linux/cpu_weights.h"
 
 namespace Uml {
 namespace {
@@ -38,13 +40,68 @@ int64_t reservation(const std::string &group, const Pools &pools, int64_t PoolNu
   return std::max(own, below);
 }
 
-int64_t weight(int64_t shares, int64_t reservedPercent, int64_t cpus) {
+int64_t shareWeight(int64_t shares) {
   static const std::map<int64_t, int64_t> levels{{-2, 50}, {-3, 100}, {-4, 200}};
   const auto level = levels.find(shares);
-  const int64_t byShares = level == levels.end() ? shares / 10 : level->second;
-  const int64_t byMinimum = (10000 * reservedPercent + 100 * cpus - 1) / (100 * cpus);
-  return std::clamp<int64_t>(std::max(byShares, byMinimum), 1, 10000);
+  const int64_t weight = level == levels.end() ? shares / 10 : level->second;
+  return std::clamp<int64_t>(weight, 1, 10000);
 }
+
+PoolNumbers numbersOf(const std::string &group, const Pools &pools) {
+  constexpr int64_t kNormal = -3;
+  PoolNumbers pool;
+  pool.cpuShares = kNormal;
+  if (const auto found = pools.find(group); found != pools.end() && found->second.enabled) {
+    pool = found->second;
+  }
+  return pool;
+}
+
+// The CPU weights of a tree that has no group of another program beside it or in it.
+class Weights {
+ public:
+  Weights(const Pools &pools, int64_t cpus) : pools_(pools), cpus_(static_cast<uint32_t>(cpus)) {
+    for (const auto &[name, pool] : pools) {
+      if (!pool.enabled) continue;
+      for (std::string group = name; group != "host"; group = parentOf(group)) {
+        children_[parentOf(group)].insert(group);
+      }
+    }
+    children_["host"].insert("host/opt");
+    weights_["host"] = childOf("host").shareWeight;
+    weighBelow("host", Knob::Linux::kWholeMachine);
+  }
+
+  int64_t of(const std::string &group) const { return weights_.at(group); }
+
+ private:
+  Knob::Linux::CpuChild childOf(const std::string &group) const {
+    return {Knob::Linux::machinePart(reservation(group, pools_, &PoolNumbers::cpuMin), cpus_),
+            shareWeight(numbersOf(group, pools_).cpuShares)};
+  }
+
+  void weighBelow(const std::string &group, Knob::Linux::MachinePart guaranteed) {
+    Knob::Linux::CpuParent parent;
+    parent.guaranteed = guaranteed;
+    int64_t reserved = 0;
+    for (const std::string &child : children_[group]) {
+      reserved += reservation(child, pools_, &PoolNumbers::cpuMin);
+      parent.shareWeight += static_cast<uint64_t>(childOf(child).shareWeight);
+      ++parent.children;
+    }
+    parent.reservation = Knob::Linux::machinePart(reserved, cpus_);
+    const Knob::Linux::CpuDivision division = Knob::Linux::divideCpu(parent);
+    for (const std::string &child : children_[group]) {
+      weights_[child] = Knob::Linux::cpuWeightOf(division, childOf(child));
+      weighBelow(child, Knob::Linux::guaranteedPart(division, childOf(child)));
+    }
+  }
+
+  const Pools &pools_;
+  uint32_t cpus_;
+  std::map<std::string, std::set<std::string>> children_;
+  std::map<std::string, int64_t> weights_;
+};
 
 std::string linesOf(const std::string &memoryMin, const std::string &memoryMax,
                     const std::string &cpuMax, const std::string &cpuWeight) {
@@ -52,19 +109,14 @@ std::string linesOf(const std::string &memoryMin, const std::string &memoryMax,
          "\ncpu.weight: " + cpuWeight + "\n";
 }
 
-std::string linesFor(const std::string &group, const Pools &pools, int64_t cpus) {
-  constexpr int64_t kNormal = -3;
-  PoolNumbers pool;
-  pool.cpuShares = kNormal;
-  if (const auto found = pools.find(group); found != pools.end() && found->second.enabled)
-    pool = found->second;
+std::string linesFor(const std::string &group, const Pools &pools, const Weights &weights) {
+  const PoolNumbers pool = numbersOf(group, pools);
   // The least quota that the kernel takes is a thousandth of a second.
   const int64_t quota = std::max<int64_t>(pool.cpuMax * 1000, 1000);
   return linesOf(std::to_string(reservation(group, pools, &PoolNumbers::memMin) * kMiB),
                  pool.memMax == -1 ? "max" : std::to_string(pool.memMax * kMiB),
                  (pool.cpuMax == -1 ? "max" : std::to_string(quota)) + " 100000",
-                 std::to_string(weight(pool.cpuShares,
-                                       reservation(group, pools, &PoolNumbers::cpuMin), cpus)));
+                 std::to_string(weights.of(group)));
 }
 
 }  // namespace
@@ -91,11 +143,12 @@ Pools parseList(const std::string &csv) {
 }
 
 std::map<std::string, std::string> expectedFiles(const Pools &pools, int64_t cpus) {
+  const Weights weights(pools, cpus);
   std::map<std::string, std::string> files;
   for (const auto &[name, pool] : pools) {
     if (!pool.enabled) continue;
     for (std::string group = name; !group.empty(); group = parentOf(group))
-      files[group] = linesFor(group, pools, cpus);
+      files[group] = linesFor(group, pools, weights);
   }
   return files;
 }

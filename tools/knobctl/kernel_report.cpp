@@ -26,6 +26,7 @@ bool describeHost(const Knob::Configuration &configuration, KernelReport *report
   report->lines.emplace_back(
       "groups",
       host.path + "/host" + (host.hasGroups ? "" : " (none yet; the first use makes it)"));
+  for (const auto &[name, text] : host.account) report->lines.emplace_back(name, text);
   for (const std::string &problem : host.problems) {
     report->problem += (report->problem.empty() ? "" : "; ") + problem;
   }

@@ -5,8 +5,11 @@
 
 #include <fcntl.h>
 
+#include <utility>
+
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
 #include "knob/signature.h"
@@ -15,10 +18,19 @@ namespace Knob::Linux {
 namespace {
 
 struct Entry {
+  Entry(GroupId group, std::string name, size_t above)
+      : id(group), path(std::move(name)), parent(above) {}
+
   GroupId id;
   std::string path;
   size_t parent;  // index in the list; that of the first is its own
+  bool hasChildren = false;
   int64_t memorySum = 0, cpuSum = 0;
+  CpuChildren cpuChildren;  // as counted, with the division that follows
+  bool isCounted = false;   // it is there, and has a record
+  Record record;
+  MachinePart guaranteed = 0;
+  int64_t weight = 0;
 };
 
 class Checker {
@@ -30,6 +42,8 @@ class Checker {
     checkLibrary();
     list();
     for (size_t i = entries_.size(); i-- > 0;) checkEntry(entries_[i]);
+    for (Entry &entry : entries_) checkCpuChildren(entry);
+    for (size_t i = entries_.size(); i-- > 0;) checkFiles(entries_[i]);
     return std::move(findings_);
   }
 
@@ -54,11 +68,12 @@ class Checker {
   }
 
   void list() {
-    entries_.push_back({tree_.host()->id, std::string(kRootName), 0});
+    entries_.emplace_back(tree_.host()->id, std::string(kRootName), 0);
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
-        for (const Child &child : tree_.children(*tree_.find(entries_[i].id))) {
-          entries_.push_back({child.id, entries_[i].path + "/" + child.name, i});
+        for (const Child &child : readChildren(tree_.find(entries_[i].id)->fd())) {
+          entries_[i].hasChildren = true;
+          entries_.emplace_back(child.id, entries_[i].path + "/" + child.name, i);
         }
       });
     }
@@ -68,16 +83,51 @@ class Checker {
     whileThere([&] {
       const GroupPtr group = tree_.find(entry.id);
       tree_.requireAlive(*group);
-      StoredRecord stored = readRecord(group->fd());
+      StoredRecord stored = allocations_.read(*group);
       if (stored.isDamaged) repairRecord(entry, *group, stored);
       if (stored.isStored) checkRecord(entry, *group, stored.record);
       if (!stored.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
         checkMissingRecord(entry, *group, stored);
       }
-      if (!stored.isStored) return;
-      checkFiles(entry, *group, stored.record);
-      addToParent(entry, stored.record);
+      entry.record = stored.record;
+      entry.isCounted = stored.isStored;
+      if (&entry != &entries_.front()) addSharesTo(entries_[entry.parent], stored.record);
+      if (stored.isStored) addToParent(entry, stored.record);
     });
+  }
+
+  void addSharesTo(Entry &parent, const Record &child) {
+    parent.cpuChildren.count += 1;
+    parent.cpuChildren.shareWeight +=
+        static_cast<uint64_t>(weightOfShares(child.cpu.allocation.shares));
+  }
+
+  // From the top down: each group's division of the CPU follows from that above.
+  void checkCpuChildren(Entry &entry) {
+    Record counted = entry.record;
+    counted.cpu.childrenSum = entry.cpuSum;
+    const CpuDistribution &cpu = allocations_.cpu();
+    if (&entry == &entries_.front()) {
+      const HostCpu host = cpu.hostCpuBesideOthers(counted);
+      entry.guaranteed = host.guaranteed;
+      entry.weight = host.weight;
+      if (!host.keepsReservation) report(entry.path, cpu.tooHeavyText(), false);
+    } else {
+      const CpuDivision &division = entries_[entry.parent].cpuChildren.division;
+      entry.guaranteed = guaranteedPart(division, cpu.childOf(counted));
+      entry.weight = cpuWeightOf(division, cpu.childOf(counted));
+    }
+    entry.cpuChildren = entry.cpuSum == 0 ? CpuChildren()
+                                          : dividedAmong(entry.cpuChildren, entry.guaranteed,
+                                                         cpu.partOf(entry.cpuSum));
+    if (!entry.isCounted || entry.cpuChildren == entry.record.cpuChildren) return;
+    report(entry.path, "the CPU weights below it are for other groups or reservations", repair_);
+    if (repair_) whileThere([&] { repairCpuChildren(entry); });
+  }
+
+  void repairCpuChildren(Entry &entry) {
+    entry.record.cpuChildren = entry.cpuChildren;
+    writeRecord(tree_.find(entry.id)->fd(), entry.record);
   }
 
   void addToParent(const Entry &entry, const Record &record) {
@@ -138,12 +188,20 @@ class Checker {
            repair_);
   }
 
-  void checkFiles(const Entry &entry, Group &group, const Record &record) {
-    for (const Deviation &deviation : allocations_.deviations(group, record)) {
-      std::string trouble;
-      if (repair_) trouble = repairFile(group, record, deviation);
-      report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
-    }
+  void checkFiles(const Entry &entry) {
+    if (!entry.isCounted) return;
+    whileThere([&] {
+      const GroupPtr group = tree_.find(entry.id);
+      tree_.requireAlive(*group);
+      for (const Deviation &deviation :
+           allocations_.deviations(*group, entry.record, entry.weight)) {
+        std::string trouble;
+        if (repair_) trouble = repairFile(*group, entry.record, deviation);
+        report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
+      }
+      checkMembers(entry, *group);
+      checkProtection(entry);
+    });
   }
 
   // Returns why it could not be repaired; empty when it was.
@@ -165,20 +223,48 @@ class Checker {
     }
   }
 
+  void checkProtection(const Entry &entry) {
+    const int64_t surplus = entry.record.memory.allocation.min - entry.memorySum;
+    if (tree_.hierarchy().protectsRecursively || !entry.hasChildren || surplus <= 0) return;
+    report(entry.path,
+           std::to_string(surplus) +
+               " MB of its memory minimum protect nothing, since its child groups do not reserve "
+               "them: cgroup2 is mounted without memory_recursiveprot",
+           false);
+  }
+
+  // Processes that another program moved in.
+  void checkMembers(const Entry &entry, const Group &group) {
+    const int wanted = allocations_.oomScoreAdj(entry.record);
+    if (wanted == 0) return;
+    const std::vector<int64_t> without = withoutOomScoreAdj(readMembers(group.fd()), wanted);
+    if (without.empty()) return;
+    bool repaired = repair_;
+    for (const int64_t pid : without) {
+      repaired = repaired && changeOomScoreAdj(pid, 0, wanted);
+    }
+    report(entry.path,
+           std::to_string(without.size()) + " of its processes lack the oom_score_adj of " +
+               std::to_string(wanted) + " that its minimum asks for",
+           repaired);
+  }
+
   void checkMachine(int64_t memory, int64_t cpu) {
-    checkCapacity(Resource::kMemory, memory, " MB");
-    checkCapacity(Resource::kCpu, cpu, " percent of CPU");
+    checkCapacity(Resource::kMemory, memory);
+    checkCapacity(Resource::kCpu, cpu);
     for (std::string &text : unprotectedAbove(tree_.hierarchy(), memory)) {
       report(std::string(kRootName), text, false);
     }
   }
 
-  void checkCapacity(Resource resource, int64_t reserved, const std::string &unit) {
-    const int64_t capacity = allocations_.capacity(resource);
-    if (reserved <= capacity) return;
+  void checkCapacity(Resource resource, int64_t reserved) {
+    const Account &account = allocations_.account(resource);
+    if (reserved <= account.capacity()) return;
     report(std::string(kRootName),
-           "the groups reserve " + std::to_string(reserved) + unit + ", the machine has " +
-               std::to_string(capacity),
+           "more is promised than the machine can give: the groups reserve " +
+               std::to_string(reserved) + " " + unitOf(resource) + ", it has " +
+               std::to_string(account.capacity()) + " for them of " +
+               std::to_string(account.total) + " (" + textOf(account) + ")",
            false);
   }
 

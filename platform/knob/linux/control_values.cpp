@@ -6,6 +6,8 @@
 #include <array>
 #include <charconv>
 
+#include "knob/linux/cpu_weights.h"
+
 namespace Knob::Linux {
 namespace {
 
@@ -14,19 +16,11 @@ constexpr uint64_t kMegabyte = uint64_t{1024} * 1024;
 constexpr int64_t kMaxMegabytes = (int64_t{1} << 43) - 1;
 constexpr int64_t kPeriodMicroseconds = 100000;
 constexpr int64_t kMicrosecondsPerPercent = kPeriodMicroseconds / 100;
-constexpr int64_t kMinWeight = 1, kMaxWeight = 10000;
 
 struct ShareLevel {
   int64_t shares, weight;
 };
 constexpr std::array kShareLevels = {ShareLevel{-2, 50}, ShareLevel{-3, 100}, ShareLevel{-4, 200}};
-
-int64_t sharesWeight(int64_t shares) {
-  for (const ShareLevel &level : kShareLevels) {
-    if (level.shares == shares) return level.weight;
-  }
-  return std::clamp(shares / 10, kMinWeight, kMaxWeight);
-}
 
 std::string_view trimmed(std::string_view text) {
   while (!text.empty() && (text.back() == '\n' || text.back() == ' ')) text.remove_suffix(1);
@@ -35,16 +29,11 @@ std::string_view trimmed(std::string_view text) {
 
 }  // namespace
 
-ControlTexts controlTextsFor(Resource resource, const ResourceState &state, uint32_t cpus) {
-  const Allocation &allocation = state.allocation;
-  const int64_t reservation = reservationOf(state);
-  if (resource == Resource::kMemory) {
-    return {ControlText{Control::kMemoryMin, memoryText(reservation)},
-            ControlText{Control::kMemoryMax, memoryText(allocation.max)}};
-  }
-  const int64_t weight = cpuWeight(allocation.shares, reservation, cpus);
-  return {ControlText{Control::kCpuWeight, std::to_string(weight)},
-          ControlText{Control::kCpuMax, cpuMaxText(allocation.max)}};
+ControlTexts controlTextsFor(Resource resource, const ResourceState &state) {
+  const int64_t max = state.allocation.max;
+  if (resource == Resource::kCpu) return {{Control::kCpuMax, cpuMaxText(max)}};
+  return {{Control::kMemoryMin, memoryText(reservationOf(state))},
+          {Control::kMemoryMax, memoryText(max)}};
 }
 
 std::string memoryText(int64_t megabytes) {
@@ -59,12 +48,11 @@ std::string cpuMaxText(int64_t percent) {
   return quota + " " + std::to_string(kPeriodMicroseconds);
 }
 
-int64_t cpuWeight(int64_t shares, int64_t reservationPercent, uint32_t cpus) {
-  const auto count = static_cast<int64_t>(std::max<uint32_t>(cpus, 1));
-  // In 1/10000 of all CPUs, rounded up.
-  const int64_t reserved = std::min(reservationPercent, 100 * count);
-  const int64_t parts = (reserved * 100 + count - 1) / count;
-  return std::clamp(std::max(sharesWeight(shares), parts), kMinWeight, kMaxWeight);
+int64_t weightOfShares(int64_t shares) {
+  for (const ShareLevel &level : kShareLevels) {
+    if (level.shares == shares) return level.weight;
+  }
+  return std::clamp(shares / 10, kMinCpuWeight, kMaxCpuWeight);
 }
 
 std::optional<uint64_t> parseLimit(std::string_view text) {
@@ -97,7 +85,7 @@ int64_t maximumMegabytes(uint64_t bytes) {
 }
 
 int64_t sharesOfWeight(uint64_t weight) {
-  const auto known = static_cast<int64_t>(std::min<uint64_t>(weight, kMaxWeight));
+  const auto known = static_cast<int64_t>(std::min<uint64_t>(weight, kMaxCpuWeight));
   for (const ShareLevel &level : kShareLevels) {
     if (level.weight == known) return level.shares;
   }

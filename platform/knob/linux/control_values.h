@@ -4,12 +4,12 @@
 // made here.
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <limits>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "knob/admission.h"
 #include "knob/kernel.h"
@@ -26,11 +26,10 @@ struct ControlText {
   std::string text;
 };
 
-// The two files of one resource. The first is the one that holds the reservation.
-using ControlTexts = std::array<ControlText, 2>;
-
-// cpus: of the machine.
-ControlTexts controlTextsFor(Resource resource, const ResourceState &state, uint32_t cpus);
+// The files of one resource that the group's own state determines: memory.min and memory.max, or
+// cpu.max alone, since cpu.weight depends on the other groups too.
+using ControlTexts = std::vector<ControlText>;
+ControlTexts controlTextsFor(Resource resource, const ResourceState &state);
 
 // memory.min and memory.max. megabytes: 0 and up, or -1 for no limit. A number of bytes that Linux
 // cannot represent is no limit either.
@@ -40,9 +39,9 @@ std::string memoryText(int64_t megabytes);
 // microseconds, so 0 percent is written as 1.
 std::string cpuMaxText(int64_t percent);
 
-// cpu.weight, 1 to 10000: the larger of what the shares ask for (low 50, normal 100, high 200, a
-// number divided by 10) and of the reservation's part of all CPUs in 1/10000, rounded up.
-int64_t cpuWeight(int64_t shares, int64_t reservationPercent, uint32_t cpus);
+// The cpu.weight of shares where no CPU is reserved, 1 to 10000: low 50, normal 100, high 200, a
+// number divided by 10.
+int64_t weightOfShares(int64_t shares);
 
 // A decimal number or "max", with or without a line feed at its end. Nothing: it is neither.
 std::optional<uint64_t> parseLimit(std::string_view text);

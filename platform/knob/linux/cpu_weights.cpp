@@ -34,6 +34,11 @@ uint64_t roundedUp(uint64_t value) {
   return ceilDivided(value, step) * step;
 }
 
+MachinePart partBeside(int64_t weight, uint64_t othersWeight) {
+  const auto own = static_cast<uint64_t>(weight);
+  return kWholeMachine * own / (own + othersWeight);
+}
+
 uint64_t powerOfTwoFrom(uint64_t value) {
   uint64_t power = 1;
   while (power < value) power *= 2;
@@ -76,20 +81,22 @@ int64_t cpuWeightOf(const CpuDivision &parent, const CpuChild &child) {
   return std::clamp(static_cast<int64_t>(weight), kMinCpuWeight, kMaxCpuWeight);
 }
 
-std::optional<HostCpu> hostCpu(const CpuChild &host, uint64_t othersWeight) {
-  if (othersWeight == 0) return HostCpu{host.shareWeight, kWholeMachine};
+HostCpu hostCpu(const CpuChild &host, uint64_t othersWeight) {
+  if (othersWeight == 0) return {host.shareWeight, kWholeMachine, true};
   const uint64_t others = std::min(othersWeight, kMaxOthersWeight);
-  const auto shareWeight = static_cast<uint64_t>(host.shareWeight);
-  const MachinePart fair = kWholeMachine * shareWeight / (shareWeight + others);
-  if (host.reservation == 0) return HostCpu{host.shareWeight, fair};
+  const MachinePart fair = partBeside(host.shareWeight, others);
+  if (host.reservation == 0) return {host.shareWeight, fair, true};
 
   const MachinePart floor =
       host.reservation + (kWholeMachine - host.reservation) / 20 + kWholeMachine / 420;
-  if (floor <= fair) return HostCpu{host.shareWeight, fair};
-  if (floor >= kWholeMachine) return std::nullopt;
-  const uint64_t weight = ceilDivided(others * floor, kWholeMachine - floor);
-  if (weight > static_cast<uint64_t>(kMaxCpuWeight)) return std::nullopt;
-  return HostCpu{static_cast<int64_t>(weight), floor};
+  if (floor <= fair) return {host.shareWeight, fair, true};
+  if (floor < kWholeMachine) {
+    const uint64_t weight = ceilDivided(others * floor, kWholeMachine - floor);
+    if (weight <= static_cast<uint64_t>(kMaxCpuWeight)) {
+      return {static_cast<int64_t>(weight), floor, true};
+    }
+  }
+  return {kMaxCpuWeight, partBeside(kMaxCpuWeight, others), false};
 }
 
 }  // namespace Knob::Linux

@@ -14,7 +14,6 @@
 #pragma once
 
 #include <cstdint>
-#include <optional>
 
 namespace Knob::Linux {
 
@@ -68,12 +67,12 @@ int64_t cpuWeightOf(const CpuDivision &parent, const CpuChild &child);
 struct HostCpu {
   int64_t weight = 0;
   MachinePart guaranteed = 0;
+  bool keepsReservation = true;  // false: it would take more than the largest weight
 };
 
 // For the group host, beside groups of other programs. Its part is the larger of what its shares
 // give it and of its reservation with a twentieth of the rest (and 1/420 of the machine, which
-// covers the limits above). othersWeight: the sum of the weights beside it. Nothing: it would take
-// a weight above 10,000, so the reservation cannot be kept beside the others.
-std::optional<HostCpu> hostCpu(const CpuChild &host, uint64_t othersWeight);
+// covers the limits above). othersWeight: the sum of the weights beside it.
+HostCpu hostCpu(const CpuChild &host, uint64_t othersWeight);
 
 }  // namespace Knob::Linux

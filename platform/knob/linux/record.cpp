@@ -15,7 +15,9 @@
 namespace Knob::Linux {
 namespace {
 
-constexpr uint32_t kVersion = 1;
+// Version 1 ended before the numbers of cpuChildren, which are counted where they are missing.
+constexpr uint32_t kVersion = 2, kShorterVersion = 1;
+constexpr size_t kShorterSize = 112;
 constexpr uint32_t kHasSavedHigh = 1;
 
 #pragma pack(push, 1)
@@ -26,11 +28,13 @@ struct Packed {
   uint32_t version, flags;
   PackedState memory, cpu;
   uint64_t ownPeakKB, childrenPeakKB, savedHigh;
+  uint64_t children, childrenShareWeight, wholePart, freePart, divisionShareWeight;
 };
 #pragma pack(pop)
 static_assert(sizeof(PackedState) == 40 && sizeof(Packed) == kRecordSize);
 static_assert(offsetof(Packed, memory) == 8 && offsetof(Packed, cpu) == 48 &&
-              offsetof(Packed, ownPeakKB) == 88 && offsetof(Packed, savedHigh) == 104);
+              offsetof(Packed, ownPeakKB) == 88 && offsetof(Packed, savedHigh) == 104 &&
+              offsetof(Packed, children) == kShorterSize);
 
 PackedState packed(const ResourceState &state) {
   const Allocation &allocation = state.allocation;
@@ -81,20 +85,31 @@ RecordBytes encode(const Record &record) {
                     packed(record.cpu),
                     record.peaks.ownReservedPeakKB,
                     record.peaks.childrenReservedPeakKB,
-                    record.savedHigh.value_or(0)};
+                    record.savedHigh.value_or(0),
+                    record.cpuChildren.count,
+                    record.cpuChildren.shareWeight,
+                    record.cpuChildren.division.whole,
+                    record.cpuChildren.division.free,
+                    record.cpuChildren.division.shareWeight};
   RecordBytes bytes;
   std::memcpy(bytes.data(), &from, sizeof from);
   return bytes;
 }
 
 std::optional<Record> decode(std::string_view bytes) {
-  Packed from;
-  if (bytes.size() != sizeof from) return std::nullopt;
-  std::memcpy(&from, bytes.data(), sizeof from);
-  if (from.version != kVersion || (from.flags & ~kHasSavedHigh) != 0) return std::nullopt;
+  Packed from{};
+  if (bytes.size() != sizeof from && bytes.size() != kShorterSize) return std::nullopt;
+  std::memcpy(&from, bytes.data(), bytes.size());
+  if (from.version != (bytes.size() == sizeof from ? kVersion : kShorterVersion)) {
+    return std::nullopt;
+  }
+  if ((from.flags & ~kHasSavedHigh) != 0) return std::nullopt;
 
   Record record{unpacked(from.memory),
                 unpacked(from.cpu),
+                {from.children,
+                 from.childrenShareWeight,
+                 {from.wholePart, from.freePart, from.divisionShareWeight}},
                 {from.ownPeakKB, from.childrenPeakKB},
                 std::nullopt};
   if ((from.flags & kHasSavedHigh) != 0) record.savedHigh = from.savedHigh;

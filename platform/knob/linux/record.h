@@ -12,13 +12,28 @@
 
 #include "knob/admission.h"
 #include "knob/kernel.h"
+#include "knob/linux/cpu_weights.h"
 
 namespace Knob::Linux {
 
 inline constexpr const char *kRecordAttribute = "user.knob";
 
+// The sums over all children that CPU weights follow from, and how they divide the CPU. All 0 while
+// the children reserve no CPU.
+struct CpuChildren {
+  uint64_t count = 0;
+  uint64_t shareWeight = 0;
+  CpuDivision division;
+
+  bool operator==(const CpuChildren &other) const {
+    return count == other.count && shareWeight == other.shareWeight && division == other.division;
+  }
+  bool operator!=(const CpuChildren &other) const { return !(*this == other); }
+};
+
 struct Record {
   ResourceState memory, cpu;
+  CpuChildren cpuChildren;
   MemoryStatistics peaks;
   // The value of memory.high, in bytes or kUnlimited, while it is lowered to make a smaller maximum
   // possible. Another process that finds it here restores it: the one that lowered it has died.
@@ -37,7 +52,7 @@ struct StoredRecord {
   bool isDamaged = false;  // there is a record, but it cannot be read
 };
 
-inline constexpr size_t kRecordSize = 112;
+inline constexpr size_t kRecordSize = 152;
 using RecordBytes = std::array<char, kRecordSize>;
 
 RecordBytes encode(const Record &record);

@@ -17,9 +17,11 @@ UndoableWrites::~UndoableWrites() {
 
 void UndoableWrites::write(Group &group, const StoredRecord &before, const Record &after) {
   if (before.isStored && encode(before.record) == encode(after)) return;
-  undo_.emplace_back([&group, before] {
-    if (before.isStored) return writeRecord(group.fd(), before.record);
-    removeAttribute(group.fd(), kRecordAttribute);
+  // By its id, since as many groups as may change cannot all stay open.
+  undo_.emplace_back([this, id = group.id, before] {
+    const GroupPtr changed = tree_.find(id);
+    if (before.isStored) return writeRecord(changed->fd(), before.record);
+    removeAttribute(changed->fd(), kRecordAttribute);
   });
   writeRecord(group.fd(), after);
 }
@@ -27,7 +29,8 @@ void UndoableWrites::write(Group &group, const StoredRecord &before, const Recor
 void UndoableWrites::write(Group &group, Control control, const std::string &before,
                            const std::string &after) {
   if (before == after) return;
-  undo_.emplace_back([this, &group, control, before] { tree_.write(group, control, before); });
+  undo_.emplace_back(
+      [this, id = group.id, control, before] { tree_.write(*tree_.find(id), control, before); });
   tree_.write(group, control, after);
 }
 

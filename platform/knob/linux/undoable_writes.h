@@ -19,7 +19,7 @@ class UndoableWrites {
   UndoableWrites(const UndoableWrites &) = delete;
   UndoableWrites &operator=(const UndoableWrites &) = delete;
 
-  // Write unless before and after are equal. The group outlives this object. Throw KernelError.
+  // Write unless before and after are equal. Throw KernelError.
   void write(Group &group, const StoredRecord &before, const Record &after);
   void write(Group &group, Control control, const std::string &before, const std::string &after);
 

@@ -42,40 +42,26 @@ TEST(CpuMaxText, ZeroIsTheSmallestQuotaOfLinux) {
   EXPECT_EQ(cpuMaxText(2), "2000 100000");
 }
 
-struct WeightCase {
-  int64_t shares, reservation;
-  uint32_t cpus;
-  int64_t weight;
-};
-
-class CpuWeight : public testing::TestWithParam<WeightCase> {};
-
-TEST_P(CpuWeight, IsTheLargerOfSharesAndReservation) {
-  const WeightCase &row = GetParam();
-  EXPECT_EQ(cpuWeight(row.shares, row.reservation, row.cpus), row.weight);
+TEST(WeightOfShares, HasAWeightForEachLevel) {
+  EXPECT_EQ(weightOfShares(-2), 50);
+  EXPECT_EQ(weightOfShares(-3), 100);
+  EXPECT_EQ(weightOfShares(-4), 200);
 }
 
-INSTANTIATE_TEST_SUITE_P(OfSharesAlone, CpuWeight,
-                         testing::Values(WeightCase{-2, 0, 4, 50}, WeightCase{-3, 0, 4, 100},
-                                         WeightCase{-4, 0, 4, 200}, WeightCase{0, 0, 4, 1},
-                                         WeightCase{9, 0, 4, 1}, WeightCase{10, 0, 4, 1},
-                                         WeightCase{20, 0, 4, 2}, WeightCase{29, 0, 4, 2},
-                                         WeightCase{1000, 0, 4, 100}, WeightCase{99999, 0, 4, 9999},
-                                         WeightCase{100000, 0, 4, 10000},
-                                         WeightCase{kMaxInt64, 0, 4, 10000}));
-INSTANTIATE_TEST_SUITE_P(OfReservations, CpuWeight,
-                         testing::Values(WeightCase{-3, 1, 1, 100}, WeightCase{-3, 2, 1, 200},
-                                         WeightCase{-3, 75, 1, 7500}, WeightCase{0, 1, 3, 34},
-                                         WeightCase{0, 1, 200, 1}, WeightCase{-3, 100, 1, 10000},
-                                         WeightCase{-3, 400, 4, 10000},
-                                         WeightCase{-3, 401, 4, 10000}, WeightCase{-4, 4, 4, 200},
-                                         WeightCase{-4, 9, 4, 225},
-                                         WeightCase{-3, kMaxInt64, 4, 10000},
-                                         WeightCase{-3, 100, 0, 10000}));
+TEST(WeightOfShares, IsATenthOfANumberWithinTheRangeOfLinux) {
+  EXPECT_EQ(weightOfShares(0), 1);
+  EXPECT_EQ(weightOfShares(19), 1);
+  EXPECT_EQ(weightOfShares(20), 2);
+  EXPECT_EQ(weightOfShares(29), 2);
+  EXPECT_EQ(weightOfShares(1000), 100);
+  EXPECT_EQ(weightOfShares(99999), 9999);
+  EXPECT_EQ(weightOfShares(100000), 10000);
+  EXPECT_EQ(weightOfShares(kMaxInt64), 10000);
+}
 
 TEST(Shares, EveryWeightReadsBackAsSharesThatGiveIt) {
   for (uint64_t weight = 1; weight <= 10000; ++weight) {
-    EXPECT_EQ(cpuWeight(sharesOfWeight(weight), 0, 1), static_cast<int64_t>(weight));
+    EXPECT_EQ(weightOfShares(sharesOfWeight(weight)), static_cast<int64_t>(weight));
   }
 }
 

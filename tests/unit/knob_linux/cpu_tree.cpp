@@ -57,8 +57,9 @@ CpuDivision CpuTree::divisionOf(const Group &group, MachinePart guaranteed) cons
 }
 
 std::optional<HostCpu> CpuTree::weighHost() {
-  const auto host = hostCpu(childOf(groups_[kHost]), othersWeight_);
-  if (host) groups_[kHost].weight = host->weight;
+  const HostCpu host = hostCpu(childOf(groups_[kHost]), othersWeight_);
+  if (!host.keepsReservation) return std::nullopt;
+  groups_[kHost].weight = host.weight;
   return host;
 }
 

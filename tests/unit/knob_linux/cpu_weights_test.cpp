@@ -64,34 +64,40 @@ TEST(MachinePart, OfMoreThanAllCpusIsAllOfThem) {
 }
 
 TEST(HostCpu, WithoutReservationsHasTheWeightOfItsShares) {
-  EXPECT_EQ(hostCpu({0, 100}, 300)->weight, 100);
-  EXPECT_EQ(hostCpu({0, 50}, 60000)->weight, 50);
-  EXPECT_EQ(hostCpu({0, 100}, 300)->guaranteed, kWholeMachine / 4);
+  EXPECT_EQ(hostCpu({0, 100}, 300).weight, 100);
+  EXPECT_EQ(hostCpu({0, 50}, 60000).weight, 50);
+  EXPECT_EQ(hostCpu({0, 100}, 300).guaranteed, kWholeMachine / 4);
 }
 
 TEST(HostCpu, AloneHasAllOfTheMachine) {
-  EXPECT_EQ(hostCpu({kWholeMachine, 100}, 0)->weight, 100);
-  EXPECT_EQ(hostCpu({kWholeMachine, 100}, 0)->guaranteed, kWholeMachine);
+  EXPECT_EQ(hostCpu({kWholeMachine, 100}, 0).weight, 100);
+  EXPECT_EQ(hostCpu({kWholeMachine, 100}, 0).guaranteed, kWholeMachine);
 }
 
 TEST(HostCpu, AReservationWithinItsFairPartChangesNothing) {
-  EXPECT_EQ(hostCpu({machinePart(20, 1), 100}, 200)->weight, 100);
+  EXPECT_EQ(hostCpu({machinePart(20, 1), 100}, 200).weight, 100);
 }
 
 TEST(HostCpu, ALargerReservationGetsItselfAndATwentiethOfTheRest) {
   const auto host = hostCpu({machinePart(60, 1), 100}, 100);
-  ASSERT_TRUE(host);
-  EXPECT_EQ(host->weight, 165);  // 62.24 of 100 percent
-  EXPECT_NEAR(static_cast<double>(host->guaranteed) / kWholeMachine, 0.6 + 0.02 + 1 / 420.0, 1e-6);
+  EXPECT_EQ(host.weight, 165);  // 62.24 of 100 percent
+  EXPECT_NEAR(static_cast<double>(host.guaranteed) / kWholeMachine, 0.6 + 0.02 + 1 / 420.0, 1e-6);
 }
 
-TEST(HostCpu, IsRefusedOnlyAboveTheLargestWeight) {
-  const MachinePart reserved = machinePart(90, 1);
-  EXPECT_EQ(hostCpu({reserved, 100}, 1020)->weight, 9993);
-  EXPECT_FALSE(hostCpu({reserved, 100}, 1021));
-  EXPECT_FALSE(hostCpu({kWholeMachine, 100}, 1));
-  EXPECT_FALSE(hostCpu({machinePart(1, 1), 100}, UINT64_MAX));
-  EXPECT_EQ(hostCpu({0, 100}, UINT64_MAX)->weight, 100);
+TEST(HostCpu, KeepsAReservationUpToTheLargestWeight) {
+  const CpuChild host = {machinePart(90, 1), 100};
+  EXPECT_EQ(hostCpu(host, 1020).weight, 9993);
+  EXPECT_TRUE(hostCpu(host, 1020).keepsReservation);
+  EXPECT_FALSE(hostCpu(host, 1021).keepsReservation);
+  EXPECT_FALSE(hostCpu({kWholeMachine, 100}, 1).keepsReservation);
+  EXPECT_FALSE(hostCpu({machinePart(1, 1), 100}, UINT64_MAX).keepsReservation);
+  EXPECT_TRUE(hostCpu({0, 100}, UINT64_MAX).keepsReservation);
+}
+
+TEST(HostCpu, BeyondThatHasTheLargestWeight) {
+  const HostCpu host = hostCpu({machinePart(90, 1), 100}, 10000);
+  EXPECT_EQ(host.weight, 10000);
+  EXPECT_EQ(host.guaranteed, kWholeMachine / 2);
 }
 
 TEST(CpuDivision, WithoutReservationsLeavesTheWeightsOfTheShares) {

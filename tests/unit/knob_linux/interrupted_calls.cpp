@@ -6,11 +6,13 @@
 #include <sys/types.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <utility>
 
 namespace {
 
 std::function<void()> attributeAct, writeAct, everyWriteAct;
+int writesUntilFailure = 0;
 
 void actOnce(std::function<void()> &waiting) {
   if (const auto act = std::exchange(waiting, nullptr)) act();
@@ -32,6 +34,10 @@ void beforeEveryWrite(std::function<void()> act) {
   everyWriteAct = std::move(act);
 }
 
+void failWrite(int nth) {
+  writesUntilFailure = nth;
+}
+
 }  // namespace InterruptedCalls
 
 extern "C" int fsetxattr(int file, const char *name, const void *value, size_t size,
@@ -43,5 +49,9 @@ extern "C" int fsetxattr(int file, const char *name, const void *value, size_t s
 extern "C" ssize_t pwrite(int file, const void *data, size_t size, off_t offset) {
   actOnce(writeAct);
   if (everyWriteAct) everyWriteAct();
+  if (writesUntilFailure > 0 && --writesUntilFailure == 0) {
+    errno = EIO;
+    return -1;
+  }
   return ::syscall(SYS_pwrite64, file, data, size, offset);
 }

@@ -17,6 +17,7 @@ Record sample() {
   record.memory = {{10, 200, 30, -4}, 17};
   record.cpu = {{5, 600, -1, 1000}, 3};
   record.peaks = {10240, 99999999999};
+  record.cpuChildren = {7, 900, {1 << 20, 1 << 19, 1024}};
   return record;
 }
 
@@ -47,6 +48,7 @@ TEST(Record, ReadsBackAsItWasWritten) {
   EXPECT_EQ(record->cpu.childrenSum, 3);
   EXPECT_EQ(record->peaks.ownReservedPeakKB, 10240U);
   EXPECT_EQ(record->peaks.childrenReservedPeakKB, 99999999999U);
+  EXPECT_EQ(record->cpuChildren, sample().cpuChildren);
   EXPECT_FALSE(record->savedHigh);
 }
 
@@ -82,11 +84,22 @@ TEST(Record, AnotherSizeIsDamaged) {
 }
 
 TEST(Record, AnotherVersionIsDamaged) {
-  for (const char version : {'\0', '\2', '\x7f'}) {
+  for (const char version : {'\0', '\1', '\3', '\x7f'}) {
     std::string bytes = bytesOf(sample());
     bytes[0] = version;
     EXPECT_FALSE(decode(bytes)) << int{version};
   }
+}
+
+TEST(Record, OfVersion1HasNoSumsForCpuWeights) {
+  std::string bytes = bytesOf(sample()).substr(0, 112);
+  bytes[0] = 1;
+  const auto record = decode(bytes);
+  ASSERT_TRUE(record);
+  EXPECT_EQ(record->cpu.childrenSum, 3);
+  EXPECT_EQ(record->cpuChildren, CpuChildren());
+  bytes[0] = 2;
+  EXPECT_FALSE(decode(bytes));
 }
 
 TEST(Record, UnknownFlagsAreDamaged) {
