@@ -100,10 +100,11 @@ TEST_F(ExecInPool, AHostWithoutControlGroupsIsNotUsable) {
       "/usr/bin/unshare",
       {"--mount", "/bin/sh", "-c", "umount /sys/fs/cgroup; exec poolctl-exec web -- true"});
   EXPECT_EQ(result.status, 125);
-  EXPECT_EQ(result.err.rfind("poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`): "
-                             "no cgroup2 file system is mounted",
-                             0),
-            0U)
+  EXPECT_EQ(
+      result.err.rfind("poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`): "
+                       "no cgroup2 file system is mounted",
+                       0),
+      0U)
       << result.err;
 }
 
