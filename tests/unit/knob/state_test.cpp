@@ -154,8 +154,9 @@ TEST_F(State, ProcessesThatStartTogetherBootOneKernel) {
 }
 
 TEST_F(State, AFolderThatDoesNotExistIsAReason) {
-  configuration_.statePath = "/nonexistent/kernel.db";
-  EXPECT_THAT(notUsable(), HasSubstr("/nonexistent: cannot open the folder"));
+  const std::string folder = folder_.path() / "none";
+  configuration_.statePath = folder + "/kernel.db";
+  EXPECT_THAT(notUsable(), HasSubstr(folder + ": cannot open the folder"));
 }
 
 TEST_F(State, AFolderInItsPlaceIsAReason) {
