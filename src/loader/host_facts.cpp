@@ -3,21 +3,32 @@
 #include "loader/host_facts.h"
 
 #include <cstring>
+#include <exception>
 #include <string_view>
 
 #include "platform/knob.h"
 #include "platform/knob_records.h"
+#include "platform/knob_status.h"
 #include "yaml/exception.h"
 
 namespace Loader {
 namespace {
 
+[[noreturn]] void throwFailure(KNOB_ReturnStatus status) {
+  const Exception failure(YAML::Mark::null_mark(), "KNOB_Get failed");
+  if (status != KNOB_STATUS_KERNEL_NOT_USABLE) throw failure;
+  try {
+    throw KernelNotUsable(NUC_ReturnStatusToString(status));
+  } catch (const KernelNotUsable &) {
+    std::throw_with_nested(failure);
+  }
+}
+
 template <typename Record>
 Record readRecord(KNOB_NodeID node) {
   Record record{};
-  if (KNOB_Get(node, nullptr, &record, sizeof record) != 0) {
-    throw Exception(YAML::Mark::null_mark(), "KNOB_Get failed");
-  }
+  const KNOB_ReturnStatus status = KNOB_Get(node, nullptr, &record, sizeof record);
+  if (status != 0) throwFailure(status);
   return record;
 }
 

@@ -11,6 +11,7 @@
 #include "commands/commands.h"
 #include "console/message.h"
 #include "console/standard_streams.h"
+#include "loader/host_facts.h"
 #include "platform/knob.h"
 
 namespace {
@@ -69,6 +70,18 @@ int dispatch(int argc, char **argv) {
   return command->handler(argc - 1, argv + 1);
 }
 
+// An unusable kernel would otherwise be reported as a fault of the definition file that was read.
+void reportUnusableKernel(const std::exception &error) {
+  if (dynamic_cast<const Loader::KernelNotUsable *>(&error) != nullptr) {
+    Console::printError("cannot read the facts of this host: ", error.what());
+  }
+  try {
+    std::rethrow_if_nested(error);
+  } catch (const std::exception &cause) {
+    reportUnusableKernel(cause);
+  }
+}
+
 int run(int argc, char **argv) {
   requireMatchingKernel();
   if (argc >= 2 && argv[1][0] != '-') return dispatch(argc, argv);
@@ -83,6 +96,7 @@ int main(int argc, char **argv) {
   try {
     return run(argc, argv);
   } catch (const std::exception &error) {
+    reportUnusableKernel(error);
     Console::printError(error.what());
     return 1;
   }

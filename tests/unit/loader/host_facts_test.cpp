@@ -15,6 +15,7 @@
 #include "loader/file_error.h"
 #include "loader/resource_pool.h"
 #include "own_process.h"
+#include "platform/knob_status.h"
 #include "temp_folder.h"
 #include "yaml_support.h"
 
@@ -89,6 +90,30 @@ TEST(HostFacts, AreReadOnceInAProcess) {
     EXPECT_EQ(8, int64_t{pool.mem.min});
     EXPECT_EQ(&first, &Loader::hostFacts());
     EXPECT_EQ(4u, knob().calls.size());
+  });
+}
+
+TEST(HostFacts, AnUnusableKernelIsTheNestedCause) {
+  inOwnProcess([] {
+    knob().failures[KNOB_NODE_system_vmLimits] = KNOB_STATUS_KERNEL_NOT_USABLE;
+    expectNotRead();
+    try {
+      Loader::hostFacts();
+    } catch (const Loader::Exception &error) {
+      EXPECT_THROW(std::rethrow_if_nested(error), Loader::KernelNotUsable);
+    }
+  });
+}
+
+TEST(HostFacts, OtherFailuresHaveNoNestedCause) {
+  inOwnProcess([] {
+    knob().failures[KNOB_NODE_system_vmLimits] = KNOB_STATUS_FAILURE;
+    try {
+      Loader::hostFacts();
+      FAIL() << "nothing was thrown";
+    } catch (const Loader::Exception &error) {
+      EXPECT_NO_THROW(std::rethrow_if_nested(error));
+    }
   });
 }
 
