@@ -234,7 +234,7 @@ TEST_F(State, AFolderThatDoesNotExistIsAReason) {
 
 TEST_F(State, AFolderInItsPlaceIsAReason) {
   std::filesystem::create_directory(path_);
-  EXPECT_THAT(notUsable(), HasSubstr("is no regular file"));
+  EXPECT_THAT(notUsable(), HasSubstr("is not a regular file"));
 }
 
 TEST_F(State, APathThroughAFileIsAReason) {
@@ -250,7 +250,7 @@ TEST_F(State, AFileThatIsNoDatabaseIsAReason) {
 
 TEST_F(State, ADatabaseOfSomethingElseIsAReason) {
   Platform::Database(path_, Platform::Database::Mode::kCreate, 0).execute("CREATE TABLE t (i)");
-  EXPECT_THAT(notUsable(), HasSubstr("is no state of a kernel"));
+  EXPECT_THAT(notUsable(), HasSubstr("is not a state of a kernel"));
 }
 
 TEST_F(State, AnotherVersionIsAReason) {
@@ -537,12 +537,12 @@ TEST_F(DefaultPlace, AFolderThatIsOpenToOthersIsRefused) {
                 std::filesystem::create_directory(own());
                 ::chmod(own().c_str(), 0770);
               }),
-              HasSubstr(own() + ": is open to other users"));
+              HasSubstr(own() + ": other users have rights on it"));
 }
 
 TEST_F(DefaultPlace, ALinkIsRefused) {
   EXPECT_EQ(placeOfNobody([&] { std::filesystem::create_symlink("/", own()); }),
-            own() + ": is no folder");
+            own() + ": is not a folder");
 }
 
 TEST_F(DefaultPlace, ATempFolderThatCannotBeWrittenIsAReason) {
