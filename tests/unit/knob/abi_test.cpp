@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The C functions: null and small buffers, one wrapper for what is thrown, and what they answer
-// when memory ends. Built with the library's own objects, so that allocations can be made to fail.
+// The C functions: null and small buffers, one wrapper for what is thrown, and what they return
+// without memory. Built with the library's own objects, so that allocations can be made to fail.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
