@@ -166,12 +166,13 @@ HostCpu CpuDistribution::hostCpuBesideOthers(const Record &host) const {
 }
 
 std::string CpuDistribution::tooHeavyText() const {
-  std::string text = "the groups beside host weigh too much for it:";
+  std::string others;
   for (const Child &other : tree_.besideHost()) {
-    text += (text.back() == ':' ? " " : ", ") + other.name + " " +
-            std::to_string(weightBeside(tree_, other));
+    others += (others.empty() ? "" : ", ") + other.name + " (" +
+              std::to_string(weightBeside(tree_, other)) + ")";
   }
-  return text;
+  return "no cpu.weight of host keeps its CPU reservation beside " + others +
+         "; lower their weights or reserve less";
 }
 
 }  // namespace Knob::Linux

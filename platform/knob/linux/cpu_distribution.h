@@ -44,7 +44,7 @@ class CpuDistribution {
   HostCpu hostCpuBesideOthers(const Record &host) const;
   MachinePart partOf(int64_t percent) const { return machinePart(percent, facts_.cpus); }
 
-  // "the groups beside host weigh too much for it: system.slice 10000, user.slice 100".
+  // Why host cannot keep its reservation, with the names and weights of the groups beside it.
   std::string tooHeavyText() const;
 
  private:
