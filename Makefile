@@ -57,11 +57,9 @@ bench-icount: ## what commands cost in instructions, in a QEMU machine
 	@scripts/build release $(PROGRAMS) icount_programs
 	@scripts/run-bench-icount
 
-package: ## a Debian package in build/package
+package: ## Debian packages in build/package
 	@scripts/install-deps build package
-	@scripts/build package $(PROGRAMS)
-	@cd build/package && cpack -G DEB >cpack.log || { cat cpack.log; exit 1; }
-	@ls build/package/*.deb
+	@scripts/make-package
 
 install: all ## everything below /usr/local, or PREFIX; DESTDIR as usual
 	@DESTDIR="$(DESTDIR)" cmake --install build $(if $(PREFIX),--prefix "$(PREFIX)")

@@ -43,8 +43,14 @@ install(TARGETS ${programs}
         RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR} COMPONENT programs)
 install(TARGETS ${user_programs}
         RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT programs)
-install(TARGETS ${libraries}
+# The module of the etcd store is a package of its own.
+set(modules kestrel_etcd)
+set(installed_libraries ${libraries})
+list(REMOVE_ITEM installed_libraries ${modules})
+install(TARGETS ${installed_libraries}
         LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT programs NAMELINK_SKIP)
+install(TARGETS ${modules}
+        LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT etcd NAMELINK_SKIP)
 file(GLOB manual_pages CONFIGURE_DEPENDS ${CMAKE_SOURCE_DIR}/docs/man/*.[1-8])
 foreach(page ${manual_pages})
   string(REGEX MATCH "[1-8]$" section ${page})

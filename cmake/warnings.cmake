@@ -2,5 +2,5 @@
 add_compile_options(-Wall -Wextra -Wconversion -Wshadow)
 add_compile_options($<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor>)
 if(POOLCTL_WERROR)
-  add_compile_options(-Werror)
+  add_compile_options(-Wpedantic -Werror)
 endif()

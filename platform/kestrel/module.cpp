@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A module is never unloaded: the code of its backends and of exceptions under way stands in it.
+// A module is never unloaded: the code of its backends and of exceptions under way is in it.
 #include "kestrel/module.h"
 
 #include <dlfcn.h>

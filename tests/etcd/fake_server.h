@@ -25,10 +25,10 @@ class FakeServer {
  public:
   // What goes back over the connection, byte for byte. After an empty answer, and after one that
   // says "Connection: close", the connection is closed.
-  using Answer = std::function<std::string(const FakeRequest &request)>;
+  using Respond = std::function<std::string(const FakeRequest &request)>;
 
   // perByte: the pause after each byte of an answer.
-  explicit FakeServer(Answer answer,
+  explicit FakeServer(Respond respond,
                       std::chrono::milliseconds perByte = std::chrono::milliseconds(0));
   FakeServer(const FakeServer &) = delete;
   FakeServer &operator=(const FakeServer &) = delete;
@@ -46,7 +46,7 @@ class FakeServer {
   void serveConnection(UniqueFd connection);
   bool sendAll(int fd, const std::string &text) const;
 
-  Answer answer_;
+  Respond respond_;
   std::chrono::milliseconds perByte_;
   std::string place_;
   UniqueFd listener_, end_;
@@ -56,7 +56,7 @@ class FakeServer {
 };
 
 // A whole HTTP answer.
-std::string httpAnswer(int status, const std::string &body);
+std::string httpResponse(int status, const std::string &body);
 
 // A range's answer without a key.
 std::string emptyRange(const std::string &revision = "7", const std::string &cluster = "1");

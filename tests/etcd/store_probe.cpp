@@ -1,8 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// Looks one field up as any program does, through libkestrelconfig alone, and prints what came back
-// or which exception did; after that, what the process has mapped.
+// Looks one field up as any program does, through libkestrelconfig alone, and prints the result or
+// the exception; after that, what the process has mapped. The library's calls of syslog() come to
+// this program and are printed.
 //
 // usage: store_probe COMPONENT GROUP KEY FIELD
+#include <cstdarg>
+#include <cstdio>
 #include <exception>
 #include <fstream>
 #include <iostream>
@@ -43,6 +46,30 @@ void lookUp(const ConfigStoreObjectId &id, const char *field) {
 }
 
 }  // namespace
+
+void printLog(const char *format, va_list arguments) {
+  (void)std::printf("log: ");
+  (void)std::vprintf(format, arguments);
+  (void)std::printf("\n");
+}
+
+// These take the place of the C library's functions for the libraries of this process. The second
+// one is what a hardened build calls.
+extern "C" __attribute__((visibility("default"))) void syslog(int, const char *format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  printLog(format, arguments);
+  va_end(arguments);
+}
+
+// NOLINTNEXTLINE(bugprone-reserved-identifier): the name is the C library's
+extern "C" __attribute__((visibility("default"))) void __syslog_chk(int, int, const char *format,
+                                                                    ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  printLog(format, arguments);
+  va_end(arguments);
+}
 
 int main(int argc, char **argv) {
   if (argc != 5) return 2;

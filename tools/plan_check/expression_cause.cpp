@@ -43,6 +43,7 @@ struct Stop {
 bool isDigit(char c) {
   return std::isdigit(static_cast<unsigned char>(c)) != 0;
 }
+
 bool isLetter(char c) {
   return std::isalpha(static_cast<unsigned char>(c)) != 0 || c == '_';
 }

@@ -69,6 +69,7 @@ EntryChanges::EntryChanges(const DefinitionFolder &folder, const std::vector<std
     writeJournal();
   } catch (...) {
     (void)unlinkat(folder_.fd(), kNewJournal, 0);
+    (void)unlinkat(folder_.fd(), kJournal, 0);
     removeBackups(folder_, entries_);
     throw;
   }
@@ -143,19 +144,30 @@ std::vector<EntryChanges::Entry> EntryChanges::readJournal(const DefinitionFolde
   return entries;
 }
 
-// May be repeated: an entry that was put back has no second name any more. Where both names belong
-// to one file, rename() does nothing and leaves both.
+// May be repeated: an entry that was put back has no second name any more. An entry that cannot be
+// put back does not keep the others from it.
 void EntryChanges::undo(const DefinitionFolder &folder, const std::vector<Entry> &entries) {
+  std::exception_ptr failure;
   for (auto entry = entries.rbegin(); entry != entries.rend(); ++entry) {
-    if (entry->backup.empty()) {
-      unlinkIfThere(folder, entry->name);
-      continue;
+    try {
+      undoOne(folder, *entry);
+    } catch (...) {
+      if (failure == nullptr) failure = std::current_exception();
     }
-    if (renameat(folder.fd(), entry->backup.c_str(), folder.fd(), entry->name.c_str()) != 0 &&
-        errno != ENOENT)
-      throwSystemError(DefinitionFolder::pathOf(entry->name));
-    unlinkIfThere(folder, entry->backup);
   }
+  if (failure != nullptr) std::rethrow_exception(failure);
+}
+
+// Where both names belong to one file, rename() does nothing and leaves both.
+void EntryChanges::undoOne(const DefinitionFolder &folder, const Entry &entry) {
+  if (entry.backup.empty()) {
+    unlinkIfThere(folder, entry.name);
+    return;
+  }
+  if (renameat(folder.fd(), entry.backup.c_str(), folder.fd(), entry.name.c_str()) != 0 &&
+      errno != ENOENT)
+    throwSystemError(DefinitionFolder::pathOf(entry.name));
+  unlinkIfThere(folder, entry.backup);
 }
 
 void EntryChanges::removeBackups(const DefinitionFolder &folder,

@@ -42,6 +42,7 @@ class EntryChanges {
 
   static std::vector<Entry> readJournal(const DefinitionFolder &folder);
   static void undo(const DefinitionFolder &folder, const std::vector<Entry> &entries);
+  static void undoOne(const DefinitionFolder &folder, const Entry &entry);
   static void removeBackups(const DefinitionFolder &folder, const std::vector<Entry> &entries);
   void backUp(const std::string &name);
   void writeJournal();

@@ -7,8 +7,6 @@
 namespace Tools {
 
 // "NAME (poolctl) 1.2.3"
-inline std::string versionOf(const std::string &name) {
-  return name + " (poolctl) " POOLCTL_VERSION;
-}
+std::string versionOf(const std::string &name);
 
 }  // namespace Tools

@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 // The exchange format: bytes, types, round trips over every code point, and every refusal.
-#include "kestrel/exchange.h"
-
 #include <gmock/gmock.h>
 
 #include <cmath>
 #include <limits>
 #include <random>
+
+#include "kestrel/exchange_read.h"
+#include "kestrel/exchange_write.h"
 
 namespace Kestrel {
 namespace {
