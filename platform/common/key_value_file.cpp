@@ -4,9 +4,9 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <charconv>
 #include <system_error>
 
+#include "common/number.h"
 #include "common/read_file.h"
 
 namespace Platform {
@@ -14,7 +14,7 @@ namespace {
 
 constexpr std::string_view kBlanks = " \t\r";
 // Far more than any sane configuration; keeps a mistaken path from filling the memory.
-constexpr size_t kMostBytes = 1 << 20;
+constexpr size_t kMaxBytes = 1 << 20;
 
 std::string_view trimmed(std::string_view text) {
   const size_t first = text.find_first_not_of(kBlanks);
@@ -60,7 +60,7 @@ std::optional<KeyValueFile> KeyValueFile::read(const std::string &fileName,
                                                std::initializer_list<std::string_view> knownKeys) {
   std::string text;
   try {
-    text = readFile(fileName, kMostBytes);
+    text = readFile(fileName, kMaxBytes);
   } catch (const std::system_error &error) {
     if (error.code().value() == ENOENT) return std::nullopt;
     throw ConfigError(fileName + ": " + error.code().message());
@@ -104,16 +104,13 @@ std::optional<std::string> KeyValueFile::oneOf(
   return value;
 }
 
-std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t least,
-                                             int64_t most) const {
+std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t min, int64_t max) const {
   const Entry *entry = find(key);
   if (entry == nullptr) return std::nullopt;
-  int64_t number = 0;
-  const char *end = entry->value.data() + entry->value.size();
-  const auto [stop, error] = std::from_chars(entry->value.data(), end, number);
-  if (error != std::errc() || stop != end || number < least || number > most) {
+  const auto number = parseNumber<int64_t>(entry->value);
+  if (!number || *number < min || *number > max) {
     refuse(key, "bad value " + quoted(entry->value) + " (a whole number from " +
-                    std::to_string(least) + " to " + std::to_string(most) + ")");
+                    std::to_string(min) + " to " + std::to_string(max) + ")");
   }
   return number;
 }

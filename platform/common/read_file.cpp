@@ -12,7 +12,7 @@
 
 namespace Platform {
 
-std::string readFile(const std::string &path, size_t mostBytes) {
+std::string readFile(const std::string &path, size_t maxBytes) {
   const UniqueFd fd(::open(path.c_str(), O_RDONLY | O_CLOEXEC));
   if (!fd) throw std::system_error(errno, std::generic_category(), path);
 
@@ -24,7 +24,7 @@ std::string readFile(const std::string &path, size_t mostBytes) {
     if (count < 0) throw std::system_error(errno, std::generic_category(), path);
     if (count == 0) return content;
     content.append(block.data(), static_cast<size_t>(count));
-    if (content.size() > mostBytes) {
+    if (content.size() > maxBytes) {
       throw std::system_error(EFBIG, std::generic_category(), path);
     }
   }

@@ -22,7 +22,7 @@ std::string linkerText() {
 std::shared_ptr<Backend> openModule(const char *fileName, const char *engine,
                                     const Configuration &configuration) {
   const std::string module = std::string(engine) + " module";
-  void *library = dlopen(fileName, RTLD_NOW | RTLD_LOCAL | RTLD_NODELETE);
+  void *library = dlopen(fileName, RTLD_LAZY | RTLD_LOCAL | RTLD_NODELETE);
   if (library == nullptr) {
     throw storeError(configuration.file, "store: this build has no " + module, linkerText());
   }

@@ -31,7 +31,8 @@ void writeAll(int fd, std::string_view text) {
   }
 }
 
-void replaceFile(const std::string &path, std::string_view text, mode_t mode) {
+void replaceFile(const std::string &path, std::string_view text, mode_t mode,
+                 Durability durability) {
   static std::atomic<unsigned> calls{0};
   const std::string scratch =
       path + ".new-" + std::to_string(getpid()) + "-" + std::to_string(++calls);
@@ -41,7 +42,7 @@ void replaceFile(const std::string &path, std::string_view text, mode_t mode) {
   if (!fd) fail(errno, path);
   try {
     writeAll(fd.get(), text);
-    if (fsync(fd.get()) != 0) fail(errno, path);
+    if (durability == Durability::kDurable && fsync(fd.get()) != 0) fail(errno, path);
     if (rename(scratch.c_str(), path.c_str()) != 0) fail(errno, path);
   } catch (...) {
     (void)unlink(scratch.c_str());

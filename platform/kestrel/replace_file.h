@@ -9,10 +9,14 @@
 
 namespace Kestrel {
 
-// Writes TEXT beside PATH and renames it: a reader, and a loss of power, find the old content or
-// the new one. MODE is limited by the umask. Throws std::system_error; the old file is then
-// untouched, and nothing is left beside it.
-void replaceFile(const std::string &path, std::string_view text, mode_t mode);
+// kDurable: also after a loss of power the file has the old content or the new one.
+enum class Durability { kNone, kDurable };
+
+// Writes TEXT beside PATH and renames it: a reader finds the old content or the new one. MODE is
+// limited by the umask. Throws std::system_error; the old file is then untouched, and nothing is
+// left beside it.
+void replaceFile(const std::string &path, std::string_view text, mode_t mode,
+                 Durability durability = Durability::kDurable);
 
 // Writes all of TEXT. Throws std::system_error.
 void writeAll(int fd, std::string_view text);

@@ -28,7 +28,8 @@ std::string age(const RunSource &source) {
 void writeLastRun(const std::string &path, const std::string &text) {
   std::error_code ignored;  // replaceFile() reports what is wrong with the folder
   std::filesystem::create_directory(std::filesystem::path(path).parent_path(), ignored);
-  replaceFile(path, text, kMode);
+  // The file describes a run of this boot: it need not outlive it, and runs do not wait for a disk.
+  replaceFile(path, text, kMode, Durability::kNone);
 }
 
 }  // namespace

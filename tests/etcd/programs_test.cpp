@@ -206,6 +206,12 @@ TEST_F(EtcdPrograms, ARunWithoutAReferenceOpensNoStore) {
   EXPECT_EQ(server.connections(), 1);
 }
 
+TEST_F(EtcdPrograms, SeveralThreadsReadTheStore) {
+  serve();
+  put("host/pools/a", R"({"sizeMB": 7})");
+  EXPECT_EQ(world_.run(STORE_PROBE, {"host", "pools", "a", "sizeMB", "8"}).out, "400\n");
+}
+
 TEST_F(EtcdPrograms, ExceptionsOfTheModuleAreThoseOfTheLibrary) {
   serve();
   put("host/pools/a", R"({"text": "x"})");

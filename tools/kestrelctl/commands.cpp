@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Thin: a sub-command reads its options, makes one call of the store and prints the answer. What
+// Each sub-command reads its options, makes one call of the store and prints the result. What
 // may be stored and how is the store's business.
 #include "kestrelctl/commands.h"
 

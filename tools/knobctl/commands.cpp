@@ -11,8 +11,8 @@
 #include <string>
 #include <string_view>
 
-#include "knobctl/condition.h"
 #include "knobctl/kernel_access.h"
+#include "knobctl/kernel_report.h"
 #include "knobctl/start.h"
 #include "knobctl/tree.h"
 #include "shared/command_table.h"
@@ -57,9 +57,9 @@ ExitStatus boot(const Words &words) {
 }
 
 ExitStatus status(const Words &) {
-  const Condition condition = lookAtKernel();
-  for (const auto &[label, text] : condition.lines) printLine(label, text);
-  if (!condition.problem.empty()) throw Tools::Failure(Tools::kExitFailure, condition.problem);
+  const KernelReport report = reportOnKernel();
+  for (const auto &[label, text] : report.lines) printLine(label, text);
+  if (!report.problem.empty()) throw Tools::Failure(Tools::kExitFailure, report.problem);
   return Tools::kExitSuccess;
 }
 
@@ -185,8 +185,8 @@ void checkWords(CLI::App &command, Words *words) {
 
 // The parser alone would take the largest number for one that is larger still.
 bool isProcessNumber(const std::string &text) {
-  constexpr size_t kMostDigits = 18;
-  return text.size() <= kMostDigits && text.find_first_not_of("0123456789") == std::string::npos &&
+  constexpr size_t kMaxDigits = 18;
+  return text.size() <= kMaxDigits && text.find_first_not_of("0123456789") == std::string::npos &&
          text.find_first_not_of('0') != std::string::npos;
 }
 

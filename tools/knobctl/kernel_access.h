@@ -11,7 +11,7 @@
 
 namespace Knobctl {
 
-// The tool's failure for a kernel's. what: what was tried.
+// The tool's failure for a kernel's. what: what was tried, such as "delete host/opt/a".
 Tools::Failure failure(const std::string &what, const Knob::KernelError &error);
 
 // Calls OPERATION, and throws the Failure of what the kernel refuses.

@@ -2,7 +2,7 @@
 // The words of `knobctl boot` and the facts that they stand for.
 #include "knobctl/start.h"
 
-#include "knob/emulated/emulated_kernel.h"
+#include "knob/emulated/boot.h"
 #include "knob/session.h"
 #include "knobctl/kernel_access.h"
 

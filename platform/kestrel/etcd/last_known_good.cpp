@@ -2,6 +2,7 @@
 // The file is lines of words. Whatever may hold a blank or a line end is base64.
 #include "kestrel/etcd/last_known_good.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -13,6 +14,7 @@
 #include <system_error>
 
 #include "common/read_file.h"
+#include "common/unique_fd.h"
 #include "kestrel/etcd/base64.h"
 #include "kestrel/replace_file.h"
 
@@ -62,10 +64,8 @@ bool readLine(const std::string &line, StoredValues *values) {
   std::string name, first, second, rest;
   words >> name >> first >> second >> rest;
   if (!rest.empty()) return false;
-  if (name == "cluster") {
-    values->cluster = first;
-    return true;
-  }
+  if (name == "cluster") values->cluster = first;
+  if (name == "cluster" || name == "content") return true;
   if (name == "revision" || name == "time") {
     const auto number = numberIn(first);
     if (!number) return false;
@@ -120,20 +120,32 @@ std::string LastKnownGood::identity() const {
   return std::string(kFirstLine) + "\nidentity " + checksum(text + configuration_.user) + "\n";
 }
 
+// Whether the file begins as the new one would and is young. Its age is that of the file itself,
+// which is never older than the values.
+bool LastKnownGood::isFresh(const std::string &head, Clock::time_point now) const {
+  struct stat info {};
+  if (!distrust(configuration_.snapshot).empty() ||
+      stat(configuration_.snapshot.c_str(), &info) != 0) {
+    return false;
+  }
+  const auto age = now - Clock::from_time_t(info.st_mtim.tv_sec);
+  if (age < -kClockStep || age > kRewriteAge) return false;
+  std::string begin(head.size(), '\0');
+  const Platform::UniqueFd fd(open(configuration_.snapshot.c_str(), O_RDONLY | O_CLOEXEC));
+  return fd && ::read(fd.get(), begin.data(), begin.size()) == static_cast<ssize_t>(begin.size()) &&
+         begin == head;
+}
+
 std::string LastKnownGood::write(const StoredValues &values) const {
   if (configuration_.snapshot.empty()) return "";
-  StoredValues present;
-  std::string why;
-  if (read(&present, &why) && present.cluster == values.cluster &&
-      present.covered == values.covered && present.values == values.values &&
-      values.time - present.time < kRewriteAge) {
-    return "";
-  }
+  const std::string content = contentOf(values);
+  const std::string head =
+      identity() + "cluster " + values.cluster + "\ncontent " + checksum(content) + "\n";
+  if (isFresh(head, values.time)) return "";
   const auto seconds =
       std::chrono::duration_cast<std::chrono::seconds>(values.time.time_since_epoch()).count();
-  const std::string body = identity() + "cluster " + values.cluster + "\nrevision " +
-                           std::to_string(values.revision) + "\ntime " + std::to_string(seconds) +
-                           "\n" + contentOf(values);
+  const std::string body = head + "revision " + std::to_string(values.revision) + "\ntime " +
+                           std::to_string(seconds) + "\n" + content;
   const std::string &path = configuration_.snapshot;
   std::error_code ignored;  // replaceFile() reports what is wrong with the folder
   std::filesystem::create_directories(std::filesystem::path(path).parent_path(), ignored);

@@ -39,6 +39,7 @@ class LastKnownGood {
 
  private:
   std::string identity() const;
+  bool isFresh(const std::string &head, std::chrono::system_clock::time_point now) const;
 
   const Configuration &configuration_;
 };

@@ -9,7 +9,6 @@
 
 #include "knob/admission.h"
 #include "knob/emulated/group_store.h"
-#include "knob/emulated/processes.h"
 #include "knob/emulated/schema.h"
 #include "knob/peaks.h"
 
@@ -17,7 +16,7 @@ namespace Knob {
 namespace {
 
 using Platform::Database;
-using Platform::Run;
+using Platform::Query;
 using Platform::Statement;
 
 struct Group {
@@ -46,9 +45,9 @@ class Checker {
  private:
   bool checkFile() {
     Statement statement(database_, "PRAGMA quick_check(1)");
-    Run run(statement);
-    if (!run.step()) return true;
-    const std::string answer = run.text(0);
+    Query query(statement);
+    if (!query.step()) return true;
+    const std::string answer = query.text(0);
     if (answer == "ok") return true;
     findings_.push_back({statePath_, "the state is damaged: " + answer, false});
     return false;
@@ -56,12 +55,12 @@ class Checker {
 
   void readGroups() {
     Statement statement(database_, "SELECT id, parent, name FROM groups");
-    Run run(statement);
-    while (run.step()) {
+    Query query(statement);
+    while (query.step()) {
       Group group;
-      group.parent = run.integer(1);
-      group.name = run.text(2);
-      const GroupId id = run.integer(0);
+      group.parent = query.integer(1);
+      group.name = query.text(2);
+      const GroupId id = query.integer(0);
       group.memory = store_.read(id, Resource::kMemory)->state;
       group.cpu = store_.read(id, Resource::kCpu)->state;
       group.peaks = store_.read(id, Resource::kMemory)->peaks;

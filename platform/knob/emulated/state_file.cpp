@@ -71,9 +71,9 @@ void removeStateFiles(const std::string &path) {
 
 void requireVersion(Database &database, const std::string &path) {
   Platform::Statement statement(database, "SELECT version FROM kernel");
-  Platform::Run run(statement);
-  if (!run.step()) notUsable(path, "is damaged: it does not say which kernel it is of");
-  const int64_t version = run.integer(0);
+  Platform::Query query(statement);
+  if (!query.step()) notUsable(path, "is damaged: it does not say which kernel it is of");
+  const int64_t version = query.integer(0);
   if (version != kStateVersion) {
     notUsable(path, "is a state of version " + std::to_string(version) + ", this library has " +
                         std::to_string(kStateVersion));
@@ -98,6 +98,10 @@ std::string defaultStatePath() {
   }
   requireOwnFolder(folder, mode);
   return folder + "/kernel.db";
+}
+
+std::string emulatedStatePath(const Configuration &configuration) {
+  return configuration.statePath ? *configuration.statePath : defaultStatePath();
 }
 
 bool stateExists(const std::string &path) {

@@ -7,6 +7,7 @@
 
 #include "common/sqlite.h"
 #include "common/unique_fd.h"
+#include "knob/configuration.h"
 
 namespace Knob {
 
@@ -14,6 +15,10 @@ namespace Knob {
 // XDG_RUNTIME_DIR or the temp folder. Makes the folder when it is missing, and refuses one that
 // other users could change. Throws KernelError (kernel not usable).
 std::string defaultStatePath();
+
+// Where the configured kernel keeps its state: the configured path, or the default one. Throws
+// KernelError (kernel not usable) for a default folder that is not safe to use.
+std::string emulatedStatePath(const Configuration &configuration);
 
 // Whether there is something to open: a regular file that is not empty. Throws KernelError (kernel
 // not usable) for what can be no state.

@@ -129,7 +129,7 @@ TEST_F(Kestrelctl, TheTypeCanBeGiven) {
 
 TEST_F(Kestrelctl, AValueThatIsNotOfItsTypeIsAUsageErrorAndMakesNoStore) {
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "7.5", "--type", "integer"}),
-            "kestrelctl: \"7.5\" is no integer\n");
+            "kestrelctl: \"7.5\" is not an integer\n");
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "9223372036854775808"}),
             "kestrelctl: \"9223372036854775808\" does not fit into 64 bits\n");
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "1", "--type", "date"}),

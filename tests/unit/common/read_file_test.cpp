@@ -11,9 +11,9 @@
 namespace Platform {
 namespace {
 
-int errnoOf(const std::string &path, size_t mostBytes) {
+int errnoOf(const std::string &path, size_t maxBytes) {
   try {
-    (void)readFile(path, mostBytes);
+    (void)readFile(path, maxBytes);
   } catch (const std::system_error &error) {
     return error.code().value();
   }

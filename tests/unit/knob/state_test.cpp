@@ -10,6 +10,7 @@
 #include <functional>
 
 #include "common/sqlite.h"
+#include "knob/emulated/boot.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "knob/emulated/state_file.h"
 #include "knob/machine_facts.h"
@@ -153,8 +154,9 @@ TEST_F(State, ProcessesThatStartTogetherBootOneKernel) {
 }
 
 TEST_F(State, AFolderThatDoesNotExistIsAReason) {
-  configuration_.statePath = "/nonexistent/kernel.db";
-  EXPECT_THAT(notUsable(), HasSubstr("/nonexistent: cannot open the folder"));
+  const std::string folder = folder_.path() / "none";
+  configuration_.statePath = folder + "/kernel.db";
+  EXPECT_THAT(notUsable(), HasSubstr(folder + ": cannot open the folder"));
 }
 
 TEST_F(State, AFolderInItsPlaceIsAReason) {
