@@ -1,8 +1,9 @@
 /* SPDX-License-Identifier: Apache-2.0 */
-/* The other side of the comparison: as many lookups of the same keys over one kept connection as
-   libcurl alone makes them, in C, without a look at what comes back but its status.
+/* The other side of the comparison: libcurl alone, in C, which reads the same values and checks
+   only the status of the responses. With a COUNT it reads so many keys one by one over one
+   connection; with "range" it reads all keys of the prefix in one request.
 
-   usage: bare_curl URL COUNT */
+   usage: bare_curl URL COUNT|range */
 #include <curl/curl.h>
 #include <stdio.h>
 #include <stdlib.h>
@@ -29,16 +30,29 @@ static void encode(const char *text, char *out) {
   *out = '\0';
 }
 
-static int lookUp(CURL *handle, int index) {
-  char key[128], encoded[256], body[512];
-  snprintf(key, sizeof key, "/kestrel/global/host/pools/p%d", index);
-  encode(key, encoded);
-  snprintf(body, sizeof body, "{\"key\":\"%s\",\"serializable\":true}", encoded);
+static int post(CURL *handle, const char *body) {
   curl_easy_setopt(handle, CURLOPT_POSTFIELDS, body);
   long status = 0;
   if (curl_easy_perform(handle) != CURLE_OK) return 0;
   curl_easy_getinfo(handle, CURLINFO_RESPONSE_CODE, &status);
   return status == 200;
+}
+
+static int lookUp(CURL *handle, int index) {
+  char key[128], encoded[256], body[512];
+  snprintf(key, sizeof key, "/kestrel/global/host/pools/p%d", index);
+  encode(key, encoded);
+  snprintf(body, sizeof body, "{\"key\":\"%s\",\"serializable\":true}", encoded);
+  return post(handle, body);
+}
+
+static int range(CURL *handle) {
+  char from[64], to[64], body[256];
+  encode("/kestrel/global/", from);
+  encode("/kestrel/global0", to);
+  snprintf(body, sizeof body, "{\"key\":\"%s\",\"range_end\":\"%s\",\"limit\":\"10000\"}", from,
+           to);
+  return post(handle, body);
 }
 
 int main(int argc, char **argv) {
@@ -52,6 +66,7 @@ int main(int argc, char **argv) {
   curl_easy_setopt(handle, CURLOPT_HTTPHEADER, headers);
   curl_easy_setopt(handle, CURLOPT_WRITEFUNCTION, discard);
   int failed = 0;
+  if (strcmp(argv[2], "range") == 0) failed = !range(handle);
   for (int i = 0; i < atoi(argv[2]); ++i) failed |= !lookUp(handle, i);
   curl_easy_cleanup(handle);
   curl_slist_free_all(headers);

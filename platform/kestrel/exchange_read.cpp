@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads the exchange format. Everything that is not understood is an error with its place; nothing
-// is skipped.
+// Everything that is not understood is an error with its place; nothing is skipped.
+#include "kestrel/exchange_read.h"
+
 #include <yaml-cpp/yaml.h>
 
 #include <array>
@@ -8,14 +9,13 @@
 #include <tuple>
 #include <utility>
 
-#include "kestrel/exchange.h"
 #include "kestrel/object_names.h"
 
 namespace Kestrel {
 
 namespace {
 
-// What yaml-cpp gives as the tag of a scalar without one: quoted, and plain.
+// yaml-cpp's tags of scalars without a tag: quoted, and plain.
 constexpr const char *kQuotedTag = "!";
 constexpr const char *kPlainTag = "?";
 
@@ -26,7 +26,7 @@ constexpr std::array<std::pair<std::string_view, Type>, 4> kStandardTags = {{
     {"tag:yaml.org,2002:str", Type::kText},
 }};
 
-// A real that is no finite number has YAML's own spelling.
+// YAML's own spellings of reals that are not finite numbers.
 constexpr std::array<std::pair<std::string_view, std::string_view>, 3> kSpecialReals = {{
     {".nan", "nan"},
     {".inf", "inf"},
@@ -61,7 +61,7 @@ class Reader {
     throw ExchangeError(place + ": " + why);
   }
 
-  // Only one document: what follows it would be lost without a word.
+  // One document only: others would be lost silently.
   YAML::Node load(const std::string &text) const {
     if (!isUtf8(text)) fail(YAML::Mark::null_mark(), "the file is not UTF-8");
     try {

@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// Writes the exchange format by hand: the bytes must not depend on the version of a library, and
-// every code point must survive, also those that emitters replace.
+// The text is written by hand: its bytes must not depend on the version of a library, and every
+// code point must survive, also those that emitters replace.
+#include "kestrel/exchange_write.h"
+
 #include <array>
 #include <cmath>
 #include <cstdint>
 #include <cstdio>
 
-#include "kestrel/exchange.h"
 #include "kestrel/object_names.h"
 
 namespace Kestrel {
@@ -24,7 +25,7 @@ bool isWordCharacter(char c) {
   return isLetter(c) || (c >= '0' && c <= '9') || c == '-' || c == '.';
 }
 
-// true for a word that no reader of YAML takes for anything but a text.
+// true for a word that every reader of YAML reads as a text.
 bool isPlainWord(const std::string &text) {
   if (text.empty() || !isLetter(text[0])) return false;
   std::string lower;
@@ -49,8 +50,8 @@ uint32_t nextCodePoint(const std::string &text, size_t *at) {
   return point;
 }
 
-// What YAML does not let stand as it is, and what would not be seen: controls, separators, the
-// byte order mark, and the points that are no characters.
+// What YAML does not allow as it is, and what would be invisible: controls, separators, the byte
+// order mark, and the points that are not characters.
 bool needsEscape(uint32_t point) {
   return point < 0x20 || (point >= 0x7F && point <= 0xA0) || point == 0x2028 || point == 0x2029 ||
          point == 0xFEFF || (point & 0xFFFE) == 0xFFFE || (point >= 0xFDD0 && point <= 0xFDEF);
@@ -103,11 +104,12 @@ std::string writtenValue(const Value &value) {
   return printed[0] == '-' ? "-." + printed.substr(1) : "." + printed;
 }
 
-// "name: value"; YAML wants a mark before a key that is longer than it looks ahead for a colon.
+// "name: value". YAML requires "?" before a key that is longer than its readers look ahead for a
+// colon.
 std::string writtenField(const std::string &name, const Value &value) {
-  constexpr size_t kLongestSimpleKey = 1000;
+  constexpr size_t kMaxSimpleKey = 1000;
   const std::string key = writtenName(name);
-  if (key.size() <= kLongestSimpleKey) return "    " + key + ": " + writtenValue(value) + "\n";
+  if (key.size() <= kMaxSimpleKey) return "    " + key + ": " + writtenValue(value) + "\n";
   return "    ? " + key + "\n    : " + writtenValue(value) + "\n";
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A module is never unloaded: the code of its backends and of exceptions under way stands in it.
+// A module is never unloaded: the code of its backends and of exceptions under way is in it.
 #include "kestrel/module.h"
 
 #include <dlfcn.h>
@@ -22,7 +22,7 @@ std::string linkerText() {
 std::shared_ptr<Backend> openModule(const char *fileName, const char *engine,
                                     const Configuration &configuration) {
   const std::string module = std::string(engine) + " module";
-  void *library = dlopen(fileName, RTLD_NOW | RTLD_LOCAL | RTLD_NODELETE);
+  void *library = dlopen(fileName, RTLD_LAZY | RTLD_LOCAL | RTLD_NODELETE);
   if (library == nullptr) {
     throw storeError(configuration.file, "store: this build has no " + module, linkerText());
   }

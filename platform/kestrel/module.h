@@ -10,13 +10,14 @@
 namespace Kestrel {
 
 // What a module exports under the name kModuleEntry, with C linkage: puts its backend into *RESULT,
-// or throws a ConfigStoreException. Opening asks no server. The number in the name changes with
-// Backend and Configuration.
+// or throws a ConfigStoreException. Opening asks no server. The number in the name is raised with
+// every change of Backend or Configuration.
 using ModuleEntry = void(const Configuration &configuration, std::shared_ptr<Backend> *result);
-inline constexpr const char *kModuleEntry = "kestrelModuleOpen1";
+inline constexpr const char *kModuleEntry = "kestrelModuleOpen2";
 
 // Loads a module by its file name, as the dynamic linker finds it, and opens its backend. ENGINE is
-// the module's name for people. Throws a ConfigStoreException when this build has no such module.
+// the engine's name, for messages. Throws a ConfigStoreException when this build has no such
+// module.
 std::shared_ptr<Backend> openModule(const char *fileName, const char *engine,
                                     const Configuration &configuration);
 

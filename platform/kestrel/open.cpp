@@ -1,13 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
-// Which engine stands behind a configuration, and what can be said of it without using it.
+// The engine of each configuration, and the report on it.
 #include "kestrel/open.h"
 
-#include <array>
-#include <chrono>
-#include <cstdio>
+#include <algorithm>
+#include <system_error>
 
+#include "common/read_file.h"
 #include "kestrel/module.h"
 #include "kestrel/sqlite_backend.h"
+#include "kestrel/text.h"
 
 namespace Kestrel {
 
@@ -16,49 +17,50 @@ namespace {
 using KestrelConfigStore::ConfigStoreException;
 
 constexpr const char *kEtcdModule = "libkestrel-etcd.so.1";
-
-std::string joined(const std::vector<std::string> &words) {
-  std::string text;
-  for (const std::string &word : words) text += (text.empty() ? "" : ", ") + word;
-  return text;
-}
+constexpr size_t kMaxLastRunBytes = 65536;
 
 void describe(const Configuration &configuration, Report *report) {
   const bool sqlite = configuration.engine == Engine::kSqlite;
   const std::string file = configuration.file;
   report->details = {
-      {"configuration", configuration.fileExists ? file : file + " (missing; the defaults hold)"},
+      {"configuration", configuration.fileExists ? file : file + " (missing; defaults are used)"},
       {"store", sqlite ? "sqlite" : "etcd"},
-      {"place", sqlite ? configuration.path : joined(configuration.endpoints)},
+      {"location", sqlite ? configuration.path : joined(configuration.endpoints)},
   };
 }
 
-std::string milliseconds(std::chrono::steady_clock::duration time) {
-  std::array<char, 64> text{};
-  const double value = std::chrono::duration<double, std::milli>(time).count();
-  (void)std::snprintf(text.data(), text.size(), "%.2f ms", value);
-  return text.data();
-}
-
-// A lookup of an id that no object has: what it costs to be answered.
-std::string timeOfAnAnswer(Backend &backend) {
-  const auto start = std::chrono::steady_clock::now();
-  (void)backend.read(ObjectId{});
-  return milliseconds(std::chrono::steady_clock::now() - start);
+// What the last run of any program on this host took from the store.
+void describeLastRun(const Configuration &configuration, Report *report) {
+  if (configuration.lastRun.empty()) return;
+  std::string text;
+  try {
+    text = Platform::readFile(configuration.lastRun, kMaxLastRunBytes);
+  } catch (const std::system_error &error) {
+    report->details.emplace_back("last run", configuration.lastRun + ": " + error.code().message());
+    return;
+  }
+  for (size_t at = 0; at < text.size();) {
+    const size_t end = std::min(text.find('\n', at), text.size());
+    report->details.emplace_back("last run", text.substr(at, end - at));
+    at = end + 1;
+  }
 }
 
 Condition look(Report *report) {
   report->details = {{"configuration", configurationFile()}};
   const Configuration configuration = readConfiguration();
   describe(configuration, report);
+  describeLastRun(configuration, report);
   const auto backend = openBackend(configuration, Access::kRead);
   if (!backend) {
     report->problem = configuration.path + ": there is no such file";
     return Condition::kMissing;
   }
-  for (const Detail &detail : backend->details()) report->details.push_back(detail);
-  report->details.emplace_back("answers in", timeOfAnAnswer(*backend));
-  return Condition::kUsable;
+  Health health = backend->health();
+  for (Detail &detail : health.details) report->details.push_back(std::move(detail));
+  report->problem = health.problem;
+  if (!health.readable) return Condition::kUnusable;
+  return health.problem.empty() ? Condition::kUsable : Condition::kLimited;
 }
 
 }  // namespace

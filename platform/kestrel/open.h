@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The way from a configuration to the store that it names.
+// Opens the store that a configuration names, and inspects it.
 #pragma once
 
 #include <memory>
@@ -11,24 +11,29 @@
 
 namespace Kestrel {
 
-// kCreate makes the store where there is none; the others leave it at that.
+// kCreate makes a missing store; the others return null for it.
 enum class Access { kRead, kChange, kCreate };
 
-// Empty: there is no store. Throws a ConfigStoreException when there is one that cannot be used.
+// Null: there is no store. Throws a ConfigStoreException for a store that cannot be used.
 std::shared_ptr<Backend> openBackend(const Configuration &configuration, Access access);
 
-// The same, for what the configuration file says now.
+// The same, with the configuration file read now.
 std::shared_ptr<Backend> openBackend(Access access);
 
-enum class Condition { kUsable, kMissing, kUnusable };
+enum class Condition {
+  kUsable,
+  kLimited,  // it can be read, but accepts no change, or its values may be old
+  kMissing,
+  kUnusable,
+};
 
 struct Report {
   Condition condition = Condition::kUnusable;
   std::vector<Detail> details;  // in the order in which people read them
-  std::string problem;          // why it cannot be used; empty when it can
+  std::string problem;          // why it is not usable; empty: it is
 };
 
-// Looks at the configuration and at the store, and never throws for what it finds wrong there.
+// Inspects the configuration and the store. What is wrong with them is in the report, not thrown.
 Report inspect();
 
 }  // namespace Kestrel

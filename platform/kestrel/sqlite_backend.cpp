@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// One transaction an operation. A reader keeps its file open and its one lookup prepared; a writer
-// opens the file for the one change.
+// Each operation is one transaction. A reader keeps its file open and its one statement prepared; a
+// writer opens the file for one change.
 #include "kestrel/sqlite_backend.h"
 
 #include "common/sqlite.h"
 #include "kestrel/errors.h"
 #include "kestrel/sqlite_file.h"
-#include "kestrel/sqlite_rows.h"
+#include "kestrel/sqlite_tables.h"
+#include "kestrel/text.h"
 
 namespace Kestrel {
 
@@ -21,18 +22,19 @@ using Platform::TransactionStatements;
 std::string reason(const SqliteError &error) {
   switch (error.code) {
     case SQLITE_BUSY:
-      return "another process keeps it locked";
+      return "another process has locked it; wait for it to end, or end it";
     case SQLITE_CORRUPT:
     case SQLITE_NOTADB:
-      return std::string("the file is damaged: ") + error.what();
+      return std::string("the file is damaged: ") + error.what() +
+             " (repair it with the sqlite3 shell's .recover, or remove it and import an export)";
     default:
       return error.what();
   }
 }
 
-// Runs one operation and gives what SQLite finds wrong the words of a store.
+// Runs one operation, and turns SQLite's errors into the store's.
 template <typename Operation>
-void withPlace(const std::string &path, const Operation &operation) {
+void withPath(const std::string &path, const Operation &operation) {
   try {
     operation();
   } catch (const SqliteError &error) {
@@ -40,32 +42,44 @@ void withPlace(const std::string &path, const Operation &operation) {
   }
 }
 
-// What one opening of the file leads to. The statement is released before the database.
+// One opening of the file. The statement is released before the database.
 struct Session {
   Session(const std::string &path, std::chrono::milliseconds timeout)
-      : file(path, timeout), lookUp(file.database(), kLookUp) {}
+      : file(path, timeout), readObject(file.database(), kReadObject) {}
 
   ReadableFile file;
-  Statement lookUp;
+  Statement readObject;
 };
 
 class SqliteBackend : public Backend {
  public:
   SqliteBackend(std::string path, std::chrono::milliseconds timeout)
       : path_(std::move(path)), timeout_(timeout) {
-    withPlace(path_, [&] { reopen(); });
+    withPath(path_, [&] { reopen(); });
   }
 
   std::optional<Fields> read(const ObjectId &id) override {
     std::optional<Fields> fields;
-    consistently([&] { fields = lookUp(session_->lookUp, id); });
+    consistently([&] { fields = readObject(session_->readObject, id); });
     return fields;
   }
 
-  std::vector<StoredObject> list(const Selection &selection) override {
-    std::vector<StoredObject> objects;
-    consistently([&] { objects = selectObjects(session_->file.database(), selection); });
-    return objects;
+  std::vector<LayerFields> layers(const ObjectId &id) override {
+    auto fields = read(id);
+    if (!fields) return {};
+    return {{path_, std::move(*fields)}};
+  }
+
+  RunSource source() const override {
+    RunSource source;
+    source.name = "sqlite";
+    return source;
+  }
+
+  Listing list(const Selection &selection) override {
+    Listing listing;
+    consistently([&] { listing = selectObjects(session_->file.database(), selection); });
+    return listing;
   }
 
   void setField(const ObjectId &id, const std::string &field, const Value &value) override {
@@ -88,10 +102,18 @@ class SqliteBackend : public Backend {
     change([&](Database &database) { replaceObjects(database, objects); });
   }
 
-  std::vector<Detail> details() override {
-    std::vector<Detail> details;
-    consistently([&] { details = describeTables(session_->file.database()); });
-    return details;
+  bool move(const ObjectId &, const std::string &, const std::string &) override {
+    throw storeError(path_, "an SQLite store has no layers");
+  }
+
+  Health health() override {
+    Health health;
+    consistently([&] { health.details = describeTables(session_->file.database()); });
+    const auto start = std::chrono::steady_clock::now();
+    (void)read(ObjectId{});
+    const auto time = std::chrono::steady_clock::now() - start;
+    health.details.emplace_back("responds in", inMilliseconds(time));
+    return health;
   }
 
   bool current() override { return session_ && session_->file.inPlace(); }
@@ -102,12 +124,12 @@ class SqliteBackend : public Backend {
     session_ = std::make_unique<Session>(path_, timeout_);
   }
 
-  // Repeats a reading that somebody else's change may have cut in two. Each new attempt needs
-  // another change at just that moment, so there is an end.
+  // Repeats a read that another process's change may have torn. Each further attempt needs another
+  // change at just that moment, so the number of attempts is bounded.
   template <typename Reading>
   void consistently(const Reading &reading) {
     constexpr int kAttempts = 10;
-    withPlace(path_, [&] {
+    withPath(path_, [&] {
       if (!session_) reopen();
       for (int attempt = 1; attempt < kAttempts; ++attempt) {
         if (isWhole(reading)) return;
@@ -117,7 +139,7 @@ class SqliteBackend : public Backend {
     });
   }
 
-  // Runs a reading; false when it has to be run again on a file opened anew.
+  // Runs a read; false when it has to be repeated on the file opened again.
   template <typename Reading>
   bool isWhole(const Reading &reading) {
     try {
@@ -128,11 +150,11 @@ class SqliteBackend : public Backend {
     return session_->file.consistent();
   }
 
-  // The own reader steps aside first: the last connection that closes a file moves the log into it.
+  // Closes the own reader first: the last connection that closes a file moves the log into it.
   template <typename Change>
   void change(const Change &apply) {
     session_.reset();
-    withPlace(path_, [&] {
+    withPath(path_, [&] {
       const auto database = openForWriting(path_);
       TransactionStatements statements(*database);
       Transaction transaction(statements, Transaction::Kind::kWrite);
@@ -150,7 +172,7 @@ class SqliteBackend : public Backend {
 
 std::shared_ptr<Backend> openSqliteBackend(const Configuration &configuration, Access access) {
   const std::string &path = configuration.path;
-  if (access == Access::kCreate) withPlace(path, [&] { createStore(path); });
+  if (access == Access::kCreate) withPath(path, [&] { createStore(path); });
   if (!fileState(path)) return nullptr;
   return std::make_shared<SqliteBackend>(path, configuration.timeout);
 }

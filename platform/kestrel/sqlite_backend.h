@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The store in one SQLite file. The tables are the schema's, the opening of the file is
-// sqlite_file's; here stands what is read and written.
+// The store in one SQLite file: which operation reads or writes what, in which transaction.
+// sqlite_tables has the tables, sqlite_file opens the file.
 #pragma once
 
 #include <memory>
@@ -12,7 +12,7 @@
 
 namespace Kestrel {
 
-// Empty: there is no such file, and the access does not make one.
+// Null: there is no such file, and the access does not make one.
 std::shared_ptr<Backend> openSqliteBackend(const Configuration &configuration, Access access);
 
 }  // namespace Kestrel

@@ -13,7 +13,7 @@
 
 #include "common/unique_fd.h"
 #include "kestrel/errors.h"
-#include "kestrel/sqlite_schema.h"
+#include "kestrel/sqlite_tables.h"
 
 namespace Kestrel {
 
@@ -35,37 +35,43 @@ FileState existing(const std::string &path) {
   return *state;
 }
 
-// Says in the system's words what SQLite only calls "unable to open".
+// SQLite reports only "unable to open"; this reports the system's reason.
 void checkReadable(const std::string &path) {
   if (faccessat(AT_FDCWD, path.c_str(), R_OK, AT_EACCESS) == 0) return;
   const int error = errno;
   throw storeError(path, "cannot be read", systemText(error));
 }
 
-// true when every change stands in the file itself and none in the log beside it.
+// true when every change is in the file itself and none in the log beside it.
 bool logIsEmpty(const std::string &path) {
   struct stat log {};
   if (stat((path + "-wal").c_str(), &log) != 0) return errno == ENOENT;
   return log.st_size == 0;
 }
 
-// A name beside PATH that is removed again, whatever happens.
+// A database beside PATH that is removed again, with the files that SQLite puts beside it.
 class ScratchFile {
  public:
   explicit ScratchFile(const std::string &path) : path_(path + ".new-" + std::to_string(getpid())) {
-    (void)unlink(path_.c_str());  // of a process of that number that was killed
+    remove();  // left by a process of the same number that was killed
     const Platform::UniqueFd fd(
         open(path_.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0644));
     const int error = errno;
     if (!fd) throw storeError(path, "cannot be made", systemText(error));
   }
-  ~ScratchFile() { (void)unlink(path_.c_str()); }
+  ~ScratchFile() { remove(); }
   ScratchFile(const ScratchFile &) = delete;
   ScratchFile &operator=(const ScratchFile &) = delete;
 
   const std::string &path() const { return path_; }
 
  private:
+  void remove() const {
+    for (const char *ending : {"", "-wal", "-shm", "-journal"}) {
+      (void)unlink((path_ + ending).c_str());
+    }
+  }
+
   std::string path_;
 };
 
@@ -75,7 +81,15 @@ void makeFolder(const std::filesystem::path &folder) {
   if (error) throw storeError(folder.string(), "cannot be made", error.message());
 }
 
-// So that the new name outlives a loss of power, as the transactions that follow do.
+// A store is published only when all of it is in its file. SQLite does not report that closing a
+// database could not move its log into the file, as on a full disk.
+void checkComplete(const std::string &path) {
+  Database database(path, Database::Mode::kImmutable, 0);
+  checkSchema(database, path);
+  (void)describeTables(database);
+}
+
+// Makes the new name outlive a loss of power, as the transactions that follow do.
 void syncFolder(const std::filesystem::path &folder) {
   const Platform::UniqueFd fd(open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   if (fd) (void)fsync(fd.get());  // some file systems have no such thing
@@ -90,7 +104,7 @@ std::optional<FileState> fileState(const std::string &path) {
     if (error == ENOENT) return std::nullopt;
     throw storeError(path, systemText(error));
   }
-  if (!S_ISREG(found.st_mode)) throw storeError(path, "is no regular file");
+  if (!S_ISREG(found.st_mode)) throw storeError(path, "is not a regular file");
   constexpr int64_t kNsPerSecond = 1000000000;
   return FileState{found.st_dev, found.st_ino, found.st_size,
                    found.st_mtim.tv_sec * kNsPerSecond + found.st_mtim.tv_nsec};
@@ -134,10 +148,13 @@ void createStore(const std::string &path) {
   makeFolder(folder);
   const ScratchFile scratch(path);
   {
+    // Without the log every page is in the file when the transaction ends; the last step only sets
+    // the mode of later changes in the file's header.
     Database database(scratch.path(), Database::Mode::kReadWrite, 0);
-    database.execute("PRAGMA journal_mode = WAL");
     createSchema(database);
-  }  // closing the only connection puts everything into the file itself
+    database.execute("PRAGMA journal_mode = WAL");
+  }
+  checkComplete(scratch.path());
   if (link(scratch.path().c_str(), path.c_str()) != 0 && errno != EEXIST) {
     const int error = errno;
     throw storeError(path, "cannot be made", systemText(error));

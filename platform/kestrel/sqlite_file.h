@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The SQLite store as a file: is it there, may it be read, how is it opened, how is it made. What
-// stands in it is the backend's business.
+// The SQLite store as a file: whether it exists and may be read, and how it is opened and made.
+// sqlite_tables has its content.
 #pragma once
 
 #include <sys/stat.h>
@@ -14,7 +14,7 @@
 
 namespace Kestrel {
 
-// What tells one state of a file from another without reading it.
+// What distinguishes two states of a file without reading it.
 struct FileState {
   dev_t device = 0;
   ino_t inode = 0;
@@ -29,25 +29,25 @@ struct FileState {
   }
 };
 
-// Nothing: there is no such file. Throws a ConfigStoreException when that cannot be told.
+// Empty: there is no such file. Throws a ConfigStoreException when that cannot be determined.
 std::optional<FileState> fileState(const std::string &path);
 
-// A file opened for reading. Usually SQLite takes part in the locking of a WAL database; where it
+// A file opened for reading. Usually SQLite takes part in the locking of a WAL database. Where it
 // cannot, because the reader may not make the files beside the database that this needs (a folder
-// of root's, a read-only medium), the file alone is read for as long as nobody writes it.
+// of root's, a read-only medium), the file alone is read for as long as no process writes it.
 class ReadableFile {
  public:
-  // The file must exist. Throws a ConfigStoreException for one that is no store, and SqliteError
-  // for one that SQLite cannot open or read.
+  // The file must exist. Throws a ConfigStoreException for a file that is not a store, and
+  // SqliteError for one that SQLite cannot open or read.
   ReadableFile(const std::string &path, std::chrono::milliseconds timeout);
 
   Platform::Database &database() { return *database_; }
 
-  // false: what was read since the opening may be half of a change; open the file again. Always
+  // false: what was read since the opening may be part of a change; open the file again. Always
   // true where SQLite takes part in the locking.
   bool consistent() const;
 
-  // The file that is now at the path is the one that was opened.
+  // Whether the file at the path is still the one that was opened.
   bool inPlace() const;
 
  private:
@@ -59,8 +59,8 @@ class ReadableFile {
   std::unique_ptr<Platform::Database> database_;
 };
 
-// Makes an empty store where there is none, whole at once: no reader ever sees a half-made one.
-// Makes its folder too. A store that is there already stays as it is.
+// Makes an empty store where there is none, and its folder. No process ever sees an incomplete one:
+// a failure leaves no file. An existing store stays as it is.
 void createStore(const std::string &path);
 
 // Opens an existing store for writing. Throws as ReadableFile does.

@@ -59,7 +59,7 @@ std::string_view withoutPlus(std::string_view text) {
 }
 
 Value parseInteger(std::string_view text) {
-  if (numberForm(text) != NumberForm::kInteger) throw unreadable(text, "is no integer");
+  if (numberForm(text) != NumberForm::kInteger) throw unreadable(text, "is not an integer");
   const std::string_view digits = withoutPlus(text);
   int64_t value = 0;
   const auto result = std::from_chars(digits.data(), digits.data() + digits.size(), value);
@@ -72,7 +72,7 @@ Value parseReal(std::string_view text) {
   if (text == "nan") return std::numeric_limits<double>::quiet_NaN();
   if (text == "inf") return kInfinity;
   if (text == "-inf") return -kInfinity;
-  if (numberForm(text) == NumberForm::kNone) throw unreadable(text, "is no real number");
+  if (numberForm(text) == NumberForm::kNone) throw unreadable(text, "is not a real number");
   const std::string_view digits = withoutPlus(text);
   double value = 0;
   const auto result = std::from_chars(digits.data(), digits.data() + digits.size(), value);

@@ -10,11 +10,19 @@ namespace {
 
 constexpr int64_t kMaxSum = std::numeric_limits<int64_t>::max();
 
-bool withinOwnLimits(const ResourceState &state) {
-  const int64_t reservation = reservationOf(state);
-  const Allocation &limits = state.allocation;
-  return (limits.max == -1 || reservation <= limits.max) &&
-         (limits.minLimit == -1 || reservation <= limits.minLimit);
+// The largest reservation that a group's own limits allow.
+int64_t ownLimit(const ResourceState &state) {
+  int64_t limit = kMaxSum;
+  for (const int64_t each : {state.allocation.max, state.allocation.minLimit}) {
+    if (each != -1) limit = std::min(limit, each);
+  }
+  return limit;
+}
+
+// Always nothing.
+std::nullopt_t refused(Refusal *refusal, const Refusal &why) {
+  if (refusal != nullptr) *refusal = why;
+  return std::nullopt;
 }
 
 }  // namespace
@@ -40,11 +48,14 @@ void requireNoneReservedBelow(const ResourceState &state, const Allocation &want
 }
 
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
-                                                const Allocation &wanted, int64_t capacity) {
+                                                const Allocation &wanted, int64_t capacity,
+                                                Refusal *refusal) {
   int64_t before = reservationOf(states.front());
   states.front().allocation = wanted;
-  if (!withinOwnLimits(states.front())) return std::nullopt;
   int64_t after = reservationOf(states.front());
+  if (const int64_t limit = ownLimit(states.front()); after > limit) {
+    return refused(refusal, {0, after - before, limit - before});
+  }
 
   for (size_t above = 1; above < states.size(); ++above) {
     if (after == before) {
@@ -56,9 +67,13 @@ std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> state
     state.childrenSum = changedSum(state.childrenSum, before, after);
     before = stateBefore;
     after = reservationOf(state);
-    if (after > before && !withinOwnLimits(state)) return std::nullopt;
+    if (const int64_t limit = ownLimit(state); after > before && after > limit) {
+      return refused(refusal, {above, after - before, limit - before});
+    }
   }
-  if (after > before && after > capacity) return std::nullopt;
+  if (after > before && after > capacity) {
+    return refused(refusal, {states.size(), after - before, capacity - before});
+  }
   return states;
 }
 

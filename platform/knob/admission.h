@@ -5,6 +5,7 @@
 // A group reserves the larger of its own min and the sum of what its children reserve.
 #pragma once
 
+#include <cstddef>
 #include <optional>
 #include <vector>
 
@@ -32,10 +33,18 @@ int64_t machineCapacity(const HostFacts &facts, Resource resource);
 // disables the group, and can wait until they are deleted; a refusal would be final.
 void requireNoneReservedBelow(const ResourceState &state, const Allocation &wanted);
 
+// Why a reservation does not fit. asked: how much more the group at the index "at" would reserve;
+// free: how much more it may. at is the number of states when it is the machine that has no room.
+struct Refusal {
+  size_t at;
+  int64_t asked, free;
+};
+
 // states: of the group first, then of every group above it, up to the root. Returns the states
 // after the group has the wanted allocation, up to the last one that changes; nothing when the
-// allocation does not fit.
+// allocation does not fit, and refusal, where given, says why.
 std::optional<std::vector<ResourceState>> admit(std::vector<ResourceState> states,
-                                                const Allocation &wanted, int64_t capacity);
+                                                const Allocation &wanted, int64_t capacity,
+                                                Refusal *refusal = nullptr);
 
 }  // namespace Knob

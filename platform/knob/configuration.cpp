@@ -17,8 +17,8 @@ constexpr std::string_view kLinuxName = "linux";
 }  // namespace
 
 std::optional<Configuration> readConfigurationFile(const std::string &fileName) {
-  const auto file =
-      Platform::KeyValueFile::read(fileName, {"kernel", "state", "cgroup-root", "max-vms"});
+  const auto file = Platform::KeyValueFile::read(
+      fileName, {"kernel", "state", "cgroup-root", "max-vms", "reserve-memory", "reserve-cpu"});
   if (!file) return std::nullopt;
 
   Configuration configuration;
@@ -32,6 +32,9 @@ std::optional<Configuration> readConfigurationFile(const std::string &fileName) 
   if (const auto maxVms = file->integer("max-vms", 0, kMostVms)) {
     configuration.maxVms = static_cast<uint32_t>(*maxVms);
   }
+  constexpr int64_t kMaxReserve = std::numeric_limits<int32_t>::max();
+  configuration.reserve.memoryMB = file->integer("reserve-memory", 0, kMaxReserve);
+  configuration.reserve.cpuPercent = file->integer("reserve-cpu", 0, kMaxReserve);
   return configuration;
 }
 

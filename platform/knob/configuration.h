@@ -8,6 +8,13 @@
 
 namespace Knob {
 
+// What the Linux kernel keeps for the system itself and never promises to groups. Absent: its
+// default.
+struct Reserve {
+  std::optional<int64_t> memoryMB;    // 5 percent of memory, at least 64
+  std::optional<int64_t> cpuPercent;  // of one CPU: 5 percent of all CPUs
+};
+
 struct Configuration {
   enum class KernelKind { kEmulated, kLinux };
 
@@ -15,6 +22,7 @@ struct Configuration {
   std::optional<std::string> statePath;  // of the emulated kernel; absent: its default place
   std::string cgroupRoot;                // of the Linux kernel; empty: the mount itself
   uint32_t maxVms = 1024;
+  Reserve reserve;     // of the Linux kernel
   std::string source;  // the file that was read; empty: there is none, and all is default
 };
 

@@ -56,44 +56,62 @@ class EtcdUsers : public ServersFixture {
   const Fields one_ = {{"n", int64_t{1}}};
 };
 
-TEST_F(EtcdUsers, TheRightPasswordReadsWhatTheUserMayRead) {
+TEST_F(EtcdUsers, TheRightPasswordReadsWhatTheRoleAllows) {
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
-  EXPECT_EQ(run->read(b_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
+  EXPECT_EQ(run->lookUp(b_), one_);
 }
 
-TEST_F(EtcdUsers, WhatTheUserMayNotReadOrChangeIsRefusedAndTheRestIsStillRead) {
+TEST_F(EtcdUsers, WhatTheRoleDoesNotAllowIsRefusedAndTheRestIsStillRead) {
   const auto run = storeOf("host");
-  EXPECT_THAT(refusalOf([&] { run->read(others_); }), HasSubstr("permission denied"));
+  EXPECT_THAT(refusalOf([&] { run->lookUp(others_); }), HasSubstr("permission denied"));
   EXPECT_THAT(refusalOf([&] { run->list({}); }), HasSubstr("permission denied"));
   EXPECT_THAT(refusalOf([&] { run->setField(a_, "n", true); }), HasSubstr("permission denied"));
   EXPECT_THAT(refusalOf([&] { run->removeObject(a_); }), HasSubstr("permission denied"));
-  EXPECT_EQ(run->read(a_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
+}
+
+TEST_F(EtcdUsers, ARoleForOneKeyIsEnoughForThatKey) {
+  asRoot({"role", "add", "key"});
+  asRoot({"role", "grant-permission", "key", "read", "/kestrel/global/d/g/a"});
+  asRoot({"user", "add", "narrow:" + std::string(kPassword)});
+  asRoot({"user", "grant-role", "narrow", "key"});
+  const auto run = storeOf("narrow");
+  EXPECT_EQ(run->lookUp(others_), one_);
+  EXPECT_THAT(refusalOf([&] { run->lookUp(a_); }), HasSubstr("permission denied"));
+  EXPECT_EQ(run->lookUp(others_), one_);
+}
+
+TEST_F(EtcdUsers, ARoleForOneComponentIsAUsableStore) {
+  const auto health = storeOf("host")->health();
+  EXPECT_EQ(health.problem, "");
+  EXPECT_THAT(health.details.back().second, HasSubstr("not for the whole prefix"));
 }
 
 TEST_F(EtcdUsers, AWrongPasswordIsRefusedOnceAndNeverShown) {
   writePassword("another secret");
   const auto run = storeOf("host");
-  const std::string why = refusalOf([&] { run->read(a_); });
+  const std::string why = refusalOf([&] { run->lookUp(a_); });
   EXPECT_THAT(why, HasSubstr("user \"host\": etcdserver: authentication failed"));
   EXPECT_THAT(why, Not(HasSubstr("secret")));
   writePassword(kPassword);
-  EXPECT_THAT(refusalOf([&] { run->read(a_); }), HasSubstr("not asked again"));
+  EXPECT_THAT(refusalOf([&] { run->lookUp(a_); }), HasSubstr("not asked again"));
 }
 
 TEST_F(EtcdUsers, AnUnknownUserIsRefused) {
-  EXPECT_THAT(refusalOf([&] { storeOf("nobody")->read(a_); }), HasSubstr("authentication failed"));
+  EXPECT_THAT(refusalOf([&] { storeOf("unknown")->lookUp(a_); }),
+              HasSubstr("authentication failed"));
 }
 
-TEST_F(EtcdUsers, WithoutAUserTheServersWishIsTold) {
-  const std::string why = refusalOf([&] { store()->read(a_); });
+TEST_F(EtcdUsers, WithoutAUserTheRefusalSaysThatOneIsRequired) {
+  const std::string why = refusalOf([&] { store()->lookUp(a_); });
   EXPECT_THAT(why, HasSubstr("user name is empty"));
-  EXPECT_THAT(why, HasSubstr("the server wants a \"user\""));
+  EXPECT_THAT(why, HasSubstr("the server requires a \"user\""));
 }
 
 TEST_F(EtcdUsers, ATokenThatTheServerForgotIsRenewed) {
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
   etcd_.member(0).kill();
   etcd_.member(0).start();
   etcd_.awaitReady(0);
@@ -102,7 +120,7 @@ TEST_F(EtcdUsers, ATokenThatTheServerForgotIsRenewed) {
 
 TEST_F(EtcdUsers, ATokenOfAnOldPasswordIsRenewedWithTheNewOne) {
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
   asRoot({"user", "delete", "host"});
   asRoot({"user", "add", "host:new"});
   asRoot({"user", "grant-role", "host", "hosts"});
@@ -112,7 +130,7 @@ TEST_F(EtcdUsers, ATokenOfAnOldPasswordIsRenewedWithTheNewOne) {
 
 TEST_F(EtcdUsers, ATokenThatCannotBeRenewedEndsTheRunsStore) {
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
   asRoot({"user", "delete", "host"});
   EXPECT_THAT(refusalOf([&] { run->read(b_); }), HasSubstr("authentication failed"));
   EXPECT_THAT(refusalOf([&] { run->read(b_); }), HasSubstr("not asked again"));
@@ -121,30 +139,25 @@ TEST_F(EtcdUsers, ATokenThatCannotBeRenewedEndsTheRunsStore) {
 TEST_F(EtcdUsers, APasswordFileThatOthersMayReadIsNotUsed) {
   for (const mode_t mode : std::initializer_list<mode_t>{0644, 0640, 0604, 0620}) {
     writePassword(kPassword, mode);
-    EXPECT_THAT(refusalOf([&] { storeOf("host")->read(a_); }),
+    EXPECT_THAT(refusalOf([&] { storeOf("host")->lookUp(a_); }),
                 HasSubstr("password: the password file: others than its owner have access"));
   }
 }
 
-TEST_F(EtcdUsers, AServerThatWantsNoUserIsAskedWithoutOne) {
+TEST_F(EtcdUsers, AServerWithoutUsersIsReadWithoutAToken) {
   asRoot({"auth", "disable"});
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
-  EXPECT_EQ(run->read(others_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
+  EXPECT_EQ(run->lookUp(others_), one_);
 }
 
-TEST_F(EtcdUsers, AuthenticationThatBeginsInTheMiddleOfARunIsFollowed) {
+TEST_F(EtcdUsers, AuthenticationThatIsEnabledDuringARunIsUsed) {
   asRoot({"auth", "disable"});
   const auto run = storeOf("host");
-  EXPECT_EQ(run->read(a_), one_);
+  EXPECT_EQ(run->lookUp(a_), one_);
   etcd_.etcdctl({"auth", "enable"});
   EXPECT_EQ(run->read(b_), one_);
   EXPECT_THAT(refusalOf([&] { run->read(others_); }), HasSubstr("permission denied"));
-}
-
-TEST_F(EtcdUsers, StatusNeedsNoPassword) {
-  const auto details = store()->details();
-  EXPECT_THAT(details.back().second, HasSubstr("etcd 3."));
 }
 
 }  // namespace

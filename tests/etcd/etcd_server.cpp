@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// etcd is asked whether it is ready, in short steps and with an end; nothing is guessed from time.
+// Readiness is read from etcd itself, in short steps and within a limit, never guessed from time.
 #include "etcd_server.h"
 
 #include <arpa/inet.h>
@@ -31,11 +31,11 @@ namespace fs = std::filesystem;
 
 namespace {
 
-constexpr std::chrono::seconds kMostStart{60};
+constexpr std::chrono::seconds kMaxStart{60};
 constexpr std::chrono::milliseconds kStep{10};
 
-// A cluster must not change its leader because two CPUs have too much to do for a moment; a single
-// server has nobody to wait for.
+// A cluster must not change its leader because two CPUs are busy for a moment; a single server
+// waits for no other.
 std::vector<std::string> timing(int count) {
   if (count == 1) return {"--heartbeat-interval=10", "--election-timeout=100"};
   return {"--heartbeat-interval=100", "--election-timeout=1000"};
@@ -90,7 +90,7 @@ void EtcdMember::start() {
   const pid_t pid = fork();
   if (pid < 0) throw std::system_error(errno, std::generic_category(), "fork");
   if (pid == 0) {
-    // It goes with the test, even when the test is killed.
+    // The server ends with the test, even when the test is killed.
     prctl(PR_SET_PDEATHSIG, SIGKILL);
     if (getppid() != parent) _exit(127);
     dup2(log.get(), 1);
@@ -167,16 +167,16 @@ std::vector<std::string> Etcd::urls() const {
   return result;
 }
 
-// A read that the whole cluster has to agree on. A server that wants a user has got so far, too.
+// A linearizable read. A server that refuses it for want of a user is ready, too.
 void Etcd::awaitReady(size_t index) {
   constexpr long kBadRequest = 400;
   Kestrel::Etcd::HttpClient client{Kestrel::Configuration()};
-  const auto end = std::chrono::steady_clock::now() + kMostStart;
+  const auto end = std::chrono::steady_clock::now() + kMaxStart;
   while (std::chrono::steady_clock::now() < end) {
-    const auto answer =
-        client.post(member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
-                    {std::chrono::seconds(5), std::chrono::seconds(5)}, size_t{1} << 16);
-    if (answer.status == 200 || answer.status == kBadRequest) return;
+    const auto response =
+        client.post({member(index).url() + "/v3/kv/range", "{\"key\":\"AA==\"}", "",
+                     std::chrono::seconds(5), std::chrono::seconds(5), size_t{1} << 16, false});
+    if (response.status == 200 || response.status == kBadRequest) return;
     std::this_thread::sleep_for(kStep);
   }
   throw std::runtime_error("etcd does not become ready:\n" + member(index).log());
@@ -187,7 +187,8 @@ Kestrel::Configuration Etcd::configuration() const {
   result.file = "test";
   result.engine = Kestrel::Engine::kEtcd;
   result.endpoints = urls();
-  // Nothing here depends on how fast this machine is, unless a test says so.
+  // No test depends on how fast this machine is, unless it sets its own times.
+  result.runTimeout = std::chrono::seconds(60);
   result.timeout = std::chrono::seconds(20);
   return result;
 }

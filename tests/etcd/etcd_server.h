@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Real etcd servers for one test: on a loopback address of the test's own, with their data in the
-// test's folder, and gone with the test however it ends.
+// test's folder, and they end with the test, however it ends.
 #pragma once
 
 #include <sys/types.h>
@@ -39,7 +39,7 @@ class EtcdMember {
 
   void start();
   void kill();    // at once, and it is gone when this returns
-  void stop();    // SIGSTOP: it holds its connections and says nothing
+  void stop();    // SIGSTOP: it keeps its connections and sends nothing
   void resume();  // SIGCONT
   std::string log() const;
 
@@ -52,7 +52,7 @@ class EtcdMember {
   pid_t pid_ = -1;
 };
 
-// One server, or a cluster of several, ready to answer.
+// One server, or a cluster of several, ready for requests.
 class Etcd {
  public:
   Etcd(const std::filesystem::path &folder, int count, const EtcdOptions &options = {});

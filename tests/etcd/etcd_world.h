@@ -21,7 +21,7 @@ inline Kestrel::ObjectId object(std::string component, std::string group, std::s
   return {std::move(key), std::move(component), std::move(group), std::move(extra)};
 }
 
-// The words of the ConfigStoreException that an action ends with; "" when it ends well. Any other
+// The message of the ConfigStoreException that an action throws; "" when it throws none. Any other
 // exception escapes.
 inline std::string refusalOf(const std::function<void()> &action) {
   try {

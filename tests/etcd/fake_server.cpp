@@ -76,8 +76,8 @@ std::string headerText(const std::string &revision, const std::string &cluster) 
 
 }  // namespace
 
-FakeServer::FakeServer(Answer answer, std::chrono::milliseconds perByte)
-    : answer_(std::move(answer)),
+FakeServer::FakeServer(Respond respond, std::chrono::milliseconds perByte)
+    : respond_(std::move(respond)),
       perByte_(perByte),
       listener_(listenOn(&place_)),
       end_(eventfd(0, EFD_CLOEXEC)) {
@@ -111,9 +111,9 @@ void FakeServer::serveConnection(UniqueFd connection) {
   setsockopt(connection.get(), SOL_SOCKET, SO_SNDTIMEO, &limit, sizeof limit);
   while (const auto request = readRequest(connection.get(), end_.get())) {
     ++requests_;
-    const std::string answer = answer_(*request);
-    if (!sendAll(connection.get(), answer)) return;
-    if (answer.empty() || answer.find("Connection: close") != std::string::npos) return;
+    const std::string response = respond_(*request);
+    if (!sendAll(connection.get(), response)) return;
+    if (response.empty() || response.find("Connection: close") != std::string::npos) return;
   }
 }
 
@@ -128,13 +128,13 @@ bool FakeServer::sendAll(int fd, const std::string &text) const {
   return true;
 }
 
-std::string httpAnswer(int status, const std::string &body) {
+std::string httpResponse(int status, const std::string &body) {
   return "HTTP/1.1 " + std::to_string(status) + " Text\r\nContent-Type: application/json\r\n" +
          "Content-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body;
 }
 
 std::string emptyRange(const std::string &revision, const std::string &cluster) {
-  return httpAnswer(200, headerText(revision, cluster) + "}");
+  return httpResponse(200, headerText(revision, cluster) + "}");
 }
 
 std::string rangeOf(const std::string &key, const std::string &value, const std::string &revision,
@@ -142,8 +142,8 @@ std::string rangeOf(const std::string &key, const std::string &value, const std:
   const std::string pair = R"({"key":")" + Kestrel::Etcd::toBase64(key) +
                            R"(","create_revision":"2","mod_revision":"2","version":"1","value":")" +
                            Kestrel::Etcd::toBase64(value) + "\"}";
-  return httpAnswer(200,
-                    headerText(revision, cluster) + R"(,"kvs":[)" + pair + R"(],"count":"1"})");
+  return httpResponse(200,
+                      headerText(revision, cluster) + R"(,"kvs":[)" + pair + R"(],"count":"1"})");
 }
 
 }  // namespace Test

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Servers that are no etcd: each test says what they answer, and when.
+// Servers that are not etcd: each test decides what they send, and when.
 #pragma once
 
 #include <atomic>
@@ -23,12 +23,12 @@ struct FakeRequest {
 // after the other on each connection, connections at the same time.
 class FakeServer {
  public:
-  // What goes back over the connection, byte for byte. After an empty answer, and after one that
-  // says "Connection: close", the connection is closed.
-  using Answer = std::function<std::string(const FakeRequest &request)>;
+  // Returns what is sent over the connection, byte for byte. After an empty response, and after one
+  // with "Connection: close", the connection is closed.
+  using Respond = std::function<std::string(const FakeRequest &request)>;
 
-  // perByte: the pause after each byte of an answer.
-  explicit FakeServer(Answer answer,
+  // perByte: the pause after each byte of a response.
+  explicit FakeServer(Respond respond,
                       std::chrono::milliseconds perByte = std::chrono::milliseconds(0));
   FakeServer(const FakeServer &) = delete;
   FakeServer &operator=(const FakeServer &) = delete;
@@ -38,7 +38,7 @@ class FakeServer {
   int requests() const { return requests_; }
   int connections() const { return connections_; }
 
-  // To be called by an answer that takes its time: waits so long, or until the server goes.
+  // For a response that takes its time: waits so long, or until the server ends.
   void wait(std::chrono::milliseconds time) const;
 
  private:
@@ -46,7 +46,7 @@ class FakeServer {
   void serveConnection(UniqueFd connection);
   bool sendAll(int fd, const std::string &text) const;
 
-  Answer answer_;
+  Respond respond_;
   std::chrono::milliseconds perByte_;
   std::string place_;
   UniqueFd listener_, end_;
@@ -55,13 +55,13 @@ class FakeServer {
   std::thread listening_;
 };
 
-// A whole HTTP answer.
-std::string httpAnswer(int status, const std::string &body);
+// A whole HTTP response.
+std::string httpResponse(int status, const std::string &body);
 
-// A range's answer without a key.
+// The response to a range, without a key.
 std::string emptyRange(const std::string &revision = "7", const std::string &cluster = "1");
 
-// A range's answer with one key; both in plain bytes.
+// The same with one key; key and value in plain bytes.
 std::string rangeOf(const std::string &key, const std::string &value,
                     const std::string &revision = "7", const std::string &cluster = "1");
 

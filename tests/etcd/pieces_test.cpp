@@ -37,14 +37,14 @@ TEST(Base64, EveryByteComesBack) {
   }
 }
 
-TEST(Base64, WhatIsNoBase64IsRefused) {
+TEST(Base64, WhatIsNotBase64IsRefused) {
   for (const char *text :
        {"Z", "Zg", "Zg=", "Zg==Zg==", "Z===", "====", "Zm9!", "Zm9v\n", "Zm-_", "=Zm9", "Z=m9"}) {
     EXPECT_EQ(fromBase64(text), std::nullopt) << text;
   }
 }
 
-TEST(ObjectKey, UnreservedBytesStayAndAllOthersAreEncoded) {
+TEST(ObjectKey, EncodesAllButUnreservedBytes) {
   EXPECT_EQ(percentEncode("azAZ09-._~"), "azAZ09-._~");
   EXPECT_EQ(percentEncode("/% +\xc3\xa9\x7f"), "%2F%25%20%2B%C3%A9%7F");
   EXPECT_EQ(percentEncode(std::string_view("\0", 1)), "%00");
@@ -62,7 +62,7 @@ TEST(ObjectKey, APercentSignWithoutTwoDigitsIsRefused) {
   }
 }
 
-TEST(ObjectKey, BeginsWithPrefixAndTheNameSpaceThatProgramsAskFor) {
+TEST(ObjectKey, BeginsWithPrefixAndNameSpace) {
   const ObjectId id{"k", "c", "g", ""};
   EXPECT_EQ(objectKey("/p", id), "/p/" + KestrelConfigStore::sGlobalNamespace + "/c/g/k");
 }
@@ -94,7 +94,7 @@ TEST(ObjectKey, EveryShortIdHasOneKeyAndComesBackFromIt) {
   }
 }
 
-TEST(ObjectKey, WhatNoObjectIsKeptUnderIsNoObject) {
+TEST(ObjectKey, AKeyThatNoIdHasIsNotAnObject) {
   for (const char *key :
        {"/p/global", "/p/global/a", "/p/global/a/b", "/p/global/a/b/c/d/e", "/p/global/a/b/c/",
         "/p/global/a/b/%2f", "/p/global/a/b/%41", "/p/global/a/b/ ", "/q/global/a/b/c",
@@ -103,7 +103,7 @@ TEST(ObjectKey, WhatNoObjectIsKeptUnderIsNoObject) {
   }
 }
 
-TEST(ObjectKey, ASelectionsEndIsBehindAllItsKeysAndBeforeAllOthers) {
+TEST(ObjectKey, ASelectionEndsAfterItsKeysAndBeforeAllOthers) {
   const std::string key = selectionKey("/p", {"a", {}});
   EXPECT_EQ(key, "/p/global/a/");
   EXPECT_EQ(endOfPrefix(key), "/p/global/a0");
@@ -164,45 +164,92 @@ TEST(ObjectValue, WhatIsFormattedReadsBack) {
 }
 
 TEST(Protocol, ZeroAndEmptyAreLeftOut) {
-  EXPECT_EQ(rangeText({"k", "", 0, false, 0}), R"({"key":"aw=="})");
-  EXPECT_EQ(rangeText({"k", "l", 5, true, 9}),
+  const ReadRequest one{{{"k", ""}}, 0, 0, false};
+  EXPECT_EQ(readText(one), R"({"key":"aw=="})");
+  EXPECT_EQ(readText({{{"k", "l"}}, 5, 9, true}),
             R"({"key":"aw==","range_end":"bA==","limit":"5","revision":"9","serializable":true})");
-  const RangeAnswer answer = readRange(R"({"header":{"revision":"3"}})");
-  EXPECT_EQ(answer.header.revision, 3);
-  EXPECT_TRUE(answer.found.empty());
-  EXPECT_FALSE(answer.more);
+  const ReadResponse response = readResponse(one, R"({"header":{"revision":"3"}})");
+  EXPECT_EQ(response.header.revision, 3);
+  ASSERT_EQ(response.ranges.size(), 1U);
+  EXPECT_TRUE(response.ranges[0].found.empty());
+  EXPECT_FALSE(response.ranges[0].more);
 }
 
 TEST(Protocol, AKeyWithoutAValueHasAnEmptyOne) {
-  const auto answer = readRange(R"({"header":{},"kvs":[{"key":"aw==","mod_revision":"4"}]})");
-  ASSERT_EQ(answer.found.size(), 1U);
-  EXPECT_EQ(answer.found[0].key, "k");
-  EXPECT_EQ(answer.found[0].value, "");
-  EXPECT_EQ(answer.found[0].modRevision, 4);
+  const auto response =
+      readResponse({{{"k", ""}}, 0, 0, false},
+                   R"({"header":{"revision":"9"},"kvs":[{"key":"aw==","mod_revision":"4"}]})");
+  ASSERT_EQ(response.ranges[0].found.size(), 1U);
+  EXPECT_EQ(response.ranges[0].found[0].key, "k");
+  EXPECT_EQ(response.ranges[0].found[0].value, "");
+  EXPECT_EQ(response.ranges[0].found[0].modRevision, 4);
 }
 
-TEST(Protocol, AChangeComparesTheRevisionAndAsksWhatIsThereOtherwise) {
-  EXPECT_EQ(changeText({"k", 4, "v"}),
+TEST(Protocol, SeveralRangesAreOneTransactionAndComeBackInOrder) {
+  const ReadRequest two{{{"k", ""}, {"l", ""}}, 0, 0, false};
+  EXPECT_STREQ(readPath(two), kTransactionPath);
+  EXPECT_EQ(readText(two), R"({"success":[{"request_range":{"key":"aw=="}},)"
+                           R"({"request_range":{"key":"bA=="}}]})");
+  const auto response = readResponse(
+      two, R"({"header":{"revision":"9"},"succeeded":true,"responses":[{"response_range":{}},)"
+           R"({"response_range":{"kvs":[{"key":"bA==","value":"dg=="}]}}]})");
+  EXPECT_TRUE(response.ranges[0].found.empty());
+  ASSERT_EQ(response.ranges[1].found.size(), 1U);
+  EXPECT_EQ(response.ranges[1].found[0].value, "v");
+  EXPECT_THROW(readResponse(two, R"({"header":{"revision":"9"}})"), ProtocolError);
+}
+
+TEST(JsonTree, DepthAndNumberOfValuesAreLimited) {
+  const std::string deepest = std::string(kMaxJsonDepth, '[') + std::string(kMaxJsonDepth, ']');
+  EXPECT_NO_THROW(parseJson(deepest));
+  EXPECT_THROW(parseJson("[" + deepest + "]"), ProtocolError);
+  std::string many = "[0";
+  for (size_t i = 2; i < kMaxJsonValues; ++i) many += ",0";
+  EXPECT_NO_THROW(parseJson(many + "]"));
+  EXPECT_THROW(parseJson(many + ",0]"), ProtocolError);
+}
+
+TEST(JsonTree, EveryKindIsRead) {
+  const JsonTree tree = parseJson(R"({"a":[null,true,-7,1.5,"x"],"b":{"c":""},"d":null})");
+  ASSERT_NE(tree.find("a"), nullptr);
+  const auto &items = tree.find("a")->items;
+  ASSERT_EQ(items.size(), 5U);
+  EXPECT_EQ(items[0].kind, JsonTree::Kind::kNull);
+  EXPECT_TRUE(items[1].truth);
+  EXPECT_EQ(items[2].text, "-7");
+  EXPECT_EQ(items[3].text, "1.5");
+  EXPECT_EQ(items[4].text, "x");
+  EXPECT_EQ(tree.find("b")->find("c")->text, "");
+  EXPECT_EQ(tree.find("d"), nullptr);
+  for (const char *text : {"", "{", "[1,]", "{\"a\"}", "nul", "1 2"}) {
+    EXPECT_THROW(parseJson(text), ProtocolError) << text;
+  }
+}
+
+TEST(Protocol, AChangeComparesTheRevision) {
+  EXPECT_EQ(changeText({{"k", 4, "v"}}),
             R"({"compare":[{"key":"aw==","target":"MOD","result":"EQUAL","mod_revision":"4"}],)"
             R"("success":[{"request_put":{"key":"aw==","value":"dg=="}}],)"
             R"("failure":[{"request_range":{"key":"aw=="}}]})");
-  EXPECT_THAT(changeText({"k", 4, std::nullopt}),
+  EXPECT_THAT(changeText({{"k", 4, std::nullopt}}),
               HasSubstr(R"("success":[{"request_delete_range":{"key":"aw=="}}])"));
 }
 
-TEST(Protocol, AChangeThatWasNotMadeTellsWhatTheKeyHolds) {
-  const auto done = readChange(R"({"header":{},"succeeded":true,"responses":[{}]})");
+TEST(Protocol, AChangeThatWasNotMadeReturnsWhatTheKeyHolds) {
+  const auto done = readChange(1, R"({"header":{},"succeeded":true,"responses":[{}]})");
   EXPECT_TRUE(done.done);
-  const auto gone = readChange(R"({"header":{},"responses":[{"response_range":{}}]})");
+  const auto gone = readChange(1, R"({"header":{},"responses":[{"response_range":{}}]})");
   EXPECT_FALSE(gone.done);
-  EXPECT_FALSE(gone.found);
+  ASSERT_EQ(gone.found.size(), 1U);
+  EXPECT_FALSE(gone.found[0]);
   const auto other = readChange(
+      1,
       R"({"header":{},"responses":[{"response_range":{"kvs":[{"key":"aw==","value":"dg=="}]}}]})");
-  ASSERT_TRUE(other.found);
-  EXPECT_EQ(other.found->value, "v");
-  EXPECT_THROW(readChange(R"({"header":{}})"), ProtocolError);
-  EXPECT_THROW(readChange(R"({"header":{},"responses":[7]})"), ProtocolError);
-  EXPECT_THROW(readChange(R"({"header":{},"responses":[{}]})"), ProtocolError);
+  ASSERT_TRUE(other.found.at(0));
+  EXPECT_EQ(other.found[0]->value, "v");
+  EXPECT_THROW(readChange(1, R"({"header":{}})"), ProtocolError);
+  EXPECT_THROW(readChange(1, R"({"header":{},"responses":[7]})"), ProtocolError);
+  EXPECT_THROW(readChange(1, R"({"header":{},"responses":[{}]})"), ProtocolError);
 }
 
 TEST(Protocol, ATokenThatWouldBreakAHeaderIsRefused) {
@@ -218,13 +265,14 @@ TEST(Protocol, ARefusalHasANumberAndWords) {
   EXPECT_EQ(refusal->code, 7);
   EXPECT_EQ(refusal->message, "m");
   EXPECT_EQ(readRefusal(R"({"error":"e","code":7})")->message, "e");
-  for (const char *json : {"", "7", "[]", "{}", R"({"code":7})", R"({"error":"e"})",
+  for (const char *json : {"7", "[]", "{}", R"({"code":7})", R"({"error":"e"})",
                            R"({"error":7,"code":7})", R"({"error":"e","code":"7"})"}) {
     EXPECT_FALSE(readRefusal(json)) << json;
   }
+  EXPECT_THROW(readRefusal(""), ProtocolError);
 }
 
-TEST(Refusal, MeansWhatItsNumberAndItsWordsSay) {
+TEST(Refusal, IsUnderstoodByItsNumberAndItsText) {
   const auto meaning = [](int64_t code, const char *text) {
     return meaningOf({code, text}, false);
   };
@@ -236,13 +284,17 @@ TEST(Refusal, MeansWhatItsNumberAndItsWordsSay) {
   EXPECT_EQ(meaning(11, "etcdserver: mvcc: required revision has been compacted"),
             Meaning::kCompacted);
   EXPECT_EQ(meaning(11, "etcdserver: mvcc: required revision is a future revision"),
-            Meaning::kBehind);
-  EXPECT_EQ(meaning(14, "etcdserver: no leader"), Meaning::kMember);
+            Meaning::kMoment);
+  EXPECT_EQ(meaning(14, "etcdserver: no leader"), Meaning::kMoment);
+  EXPECT_EQ(meaning(14, "etcdserver: leader changed"), Meaning::kMoment);
+  EXPECT_EQ(meaning(14, "etcdserver: server stopped"), Meaning::kMember);
+  // A change that may have been begun is not sent again.
+  EXPECT_EQ(meaningOf({14, "etcdserver: leader changed"}, true), Meaning::kMember);
   EXPECT_EQ(meaning(16, "etcdserver: invalid auth token"), Meaning::kToken);
   EXPECT_EQ(meaning(99, "whatever"), Meaning::kRefused);
 }
 
-TEST(Refusal, AMemberWithTooMuchToDoIsPassedOverAndAFullStoreIsNot) {
+TEST(Refusal, AFullStoreIsRefusedAndABusyMemberIsSkipped) {
   EXPECT_EQ(meaningOf({8, "etcdserver: too many requests"}, false), Meaning::kMember);
   EXPECT_EQ(meaningOf({8, "etcdserver: mvcc: database space exceeded"}, true), Meaning::kRefused);
 }
@@ -274,7 +326,7 @@ TEST_F(PasswordFile, IsRefusedWhenOthersHaveAccess) {
   }
 }
 
-TEST_F(PasswordFile, IsRefusedWhenItHoldsNoPasswordOrMoreThanOne) {
+TEST_F(PasswordFile, IsRefusedUnlessItHoldsOnePassword) {
   const auto refusal = [&](const std::string &text) {
     return ::Test::refusalOf([&] { (void)readPassword(write(text)); });
   };

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // TLS on a real server, with certificates that the test makes.
 #include <gmock/gmock.h>
+#include <sys/stat.h>
+
+#include <cstdlib>
 
 #include "certificates.h"
 #include "etcd_world.h"
@@ -67,7 +70,7 @@ TEST_F(EtcdTls, AServerOfAnotherAuthorityIsRefused) {
   EXPECT_THAT(refusal(configuration()), HasSubstr("SSL certificate problem: unable to get"));
 }
 
-TEST_F(EtcdTls, WithoutANamedAuthorityTheSystemsOnesHold) {
+TEST_F(EtcdTls, WithoutANamedAuthorityTheSystemsOnesCount) {
   serve(authority_.issue("server", ownAddress()));
   auto settings = configuration();
   settings.cacert.clear();
@@ -85,19 +88,19 @@ TEST_F(EtcdTls, AServerOfAnotherNameIsRefused) {
   EXPECT_THAT(refusal(configuration()), HasSubstr("no alternative certificate subject name"));
 }
 
-TEST_F(EtcdTls, AClientThatTheServerKnowsIsAnswered) {
+TEST_F(EtcdTls, AClientThatTheServerKnowsIsAccepted) {
   serveKnownClients();
   EXPECT_EQ(refusal(configurationOf(authority_.issue("client", "127.0.0.1"))), "");
 }
 
-TEST_F(EtcdTls, AClientWithoutACertificateOrWithAnExpiredOrAStrangeOneIsRefused) {
+TEST_F(EtcdTls, AClientWithAMissingOrWrongCertificateIsRefused) {
   serveKnownClients();
   // Which of the two sides sees the end of the connection first decides about the words.
-  EXPECT_THAT(refusal(configuration()), HasSubstr("no member answers"));
+  EXPECT_THAT(refusal(configuration()), HasSubstr("no member responds"));
   const auto late = authority_.issue("late", "127.0.0.1", Authority::Validity::kOver);
-  EXPECT_THAT(refusal(configurationOf(late)), HasSubstr("no member answers"));
+  EXPECT_THAT(refusal(configurationOf(late)), HasSubstr("no member responds"));
   const auto stranger = stranger_.issue("stranger", "127.0.0.1");
-  EXPECT_THAT(refusal(configurationOf(stranger)), HasSubstr("no member answers"));
+  EXPECT_THAT(refusal(configurationOf(stranger)), HasSubstr("no member responds"));
 }
 
 TEST_F(EtcdTls, AKeyOfAnotherCertificateIsRefused) {
@@ -107,7 +110,41 @@ TEST_F(EtcdTls, AKeyOfAnotherCertificateIsRefused) {
   EXPECT_THAT(refusal(configurationOf(client)), HasSubstr("key"));
 }
 
-TEST_F(EtcdTls, AFileThatIsMissingOrNoCertificateIsNamed) {
+TEST_F(EtcdTls, AKeyThatOtherUsersMayReadIsNotUsed) {
+  serveKnownClients();
+  const Certificate client = authority_.issue("client", "127.0.0.1");
+  for (const mode_t mode : std::initializer_list<mode_t>{0644, 0604, 0620, 0602}) {
+    ASSERT_EQ(chmod(client.key.c_str(), mode), 0);
+    EXPECT_THAT(refusal(configurationOf(client)), HasSubstr("other users have access"));
+  }
+  ASSERT_EQ(chmod(client.key.c_str(), 0640), 0);
+  EXPECT_EQ(refusal(configurationOf(client)), "");
+}
+
+TEST_F(EtcdTls, TheSecretsOfASessionAreNotLogged) {
+  serve(authority_.issue("server", ownAddress()));
+  const auto log = folder_.path() / "keys";
+  setenv("SSLKEYLOGFILE", log.c_str(), 1);
+  EXPECT_EQ(refusal(configuration()), "");
+  EXPECT_FALSE(std::filesystem::exists(log));
+  EXPECT_STREQ(getenv("SSLKEYLOGFILE"), log.c_str());
+}
+
+// Old values must not hide that the fleet no longer accepts the host.
+TEST_F(EtcdTls, ARefusedCertificateDoesNotLeadToTheLastKnownGood) {
+  serveKnownClients();
+  auto settings = configurationOf(authority_.issue("client", "127.0.0.1"));
+  settings.snapshot = folder_.path() / "snapshot";
+  const auto a = object("c", "g", "a");
+  EXPECT_EQ(Kestrel::Etcd::openEtcdBackend(settings)->lookUp(a), (Fields{{"n", int64_t{1}}}));
+  const Certificate other = stranger_.issue("stranger", "127.0.0.1");
+  settings.cert = other.cert;
+  settings.key = other.key;
+  const auto run = Kestrel::Etcd::openEtcdBackend(settings);
+  EXPECT_NE(refusalOf([&] { run->lookUp(a); }), "") << run->source().problem;
+}
+
+TEST_F(EtcdTls, AFileThatIsMissingOrNotACertificateIsNamed) {
   serve(authority_.issue("server", ownAddress()));
   auto settings = configuration();
   settings.cacert = folder_.path() / "none.crt";
@@ -117,11 +154,11 @@ TEST_F(EtcdTls, AFileThatIsMissingOrNoCertificateIsNamed) {
   EXPECT_THAT(refusal(settings), HasSubstr("none.crt"));
 }
 
-TEST_F(EtcdTls, APlainConnectionToATlsServerIsAFailureOfTheMember) {
+TEST_F(EtcdTls, APlainConnectionToATlsServerFails) {
   serve(authority_.issue("server", ownAddress()));
   auto settings = configuration();
   settings.endpoints[0].replace(0, 5, "http");
-  EXPECT_THAT(refusal(settings), HasSubstr("no member answers"));
+  EXPECT_THAT(refusal(settings), HasSubstr("no member responds"));
 }
 
 }  // namespace

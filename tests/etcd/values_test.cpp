@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Objects and their values on a real server: what is written comes back, what was written by hand
-// is read or refused, and every name has a place of its own.
+// is read or refused, and every name has a key of its own.
 #include <cmath>
 #include <limits>
 
@@ -39,7 +39,7 @@ TEST_F(EtcdValues, EveryTypeComesBackAsItWasSet) {
   EXPECT_EQ(store()->read(id_), fields);
 }
 
-TEST_F(EtcdValues, WholeRealTruthAndTextStayApart) {
+TEST_F(EtcdValues, IntegerRealBooleanAndTextStayApart) {
   const Fields fields = {
       {"a", int64_t{7}}, {"b", 7.0}, {"c", true}, {"d", std::string("7")}, {"e", 1e22}};
   store()->replace({{id_, fields}});
@@ -97,16 +97,16 @@ struct BadValue {
 
 class EtcdBadValues : public EtcdValues {};
 
-TEST_F(EtcdBadValues, AreRefusedWithKeyAndReasonAndAreNeverOverwritten) {
+TEST_F(EtcdBadValues, AreRefusedWithTheirKeyAndNeverOverwritten) {
   const BadValue values[] = {
-      {"sizeMB=7", "is no JSON"},
-      {"{\"a\":1", "is no JSON"},
-      {"{\"a\":1} x", "is no JSON"},
-      {"{\"a\":\"\xff\"}", "is no JSON"},
-      {"7", "is no JSON object"},
-      {"\"text\"", "is no JSON object"},
-      {"null", "is no JSON object"},
-      {"[{\"a\":1}]", "is no JSON object"},
+      {"sizeMB=7", "is not JSON"},
+      {"{\"a\":1", "is not JSON"},
+      {"{\"a\":1} x", "is not JSON"},
+      {"{\"a\":\"\xff\"}", "is not JSON"},
+      {"7", "is not a JSON object"},
+      {"\"text\"", "is not a JSON object"},
+      {"null", "is not a JSON object"},
+      {"[{\"a\":1}]", "is not a JSON object"},
       {"{\"a\":{\"b\":1}}", "field \"a\" is an object"},
       {"{\"a\":[1]}", "field \"a\" is an array"},
       {"{\"a\":null}", "field \"a\" is null"},
@@ -119,7 +119,7 @@ TEST_F(EtcdBadValues, AreRefusedWithKeyAndReasonAndAreNeverOverwritten) {
   for (const auto &[json, why] : values) {
     put(key_, json);
     for (const std::string &message :
-         {refusalOf([&] { store()->read(id_); }), refusalOf([&] { store()->list({}); }),
+         {refusalOf([&] { store()->read(id_); }), refusalOf([&] { store()->lookUp(id_); }),
           refusalOf([&] { store()->setField(id_, "b", true); }),
           refusalOf([&] { store()->removeField(id_, "a"); })}) {
       EXPECT_NE(message.find("/kestrel/global/" + key_), std::string::npos) << json << message;
@@ -139,7 +139,7 @@ TEST_F(EtcdBadValues, LeaveOtherObjectsReadable) {
   EXPECT_EQ(run->read(object("host", "pools", "other")), (Fields{{"a", int64_t{1}}}));
 }
 
-TEST_F(EtcdValues, EveryNameHasAPlaceOfItsOwn) {
+TEST_F(EtcdValues, EveryNameHasAKeyOfItsOwn) {
   const std::vector<ObjectId> ids = {object("", "", ""),
                                      object("", "", "", "x"),
                                      object("", "", "x"),
@@ -170,7 +170,7 @@ TEST_F(EtcdValues, EveryNameHasAPlaceOfItsOwn) {
   for (const ObjectId &id : ids) {
     EXPECT_EQ(store()->read(id), (Fields{{"n", ++number}})) << id.component << id.group << id.key;
   }
-  EXPECT_EQ(store()->list({}).size(), ids.size());
+  EXPECT_EQ(store()->list({}).objects.size(), ids.size());
 }
 
 TEST_F(EtcdValues, AnObjectsKeyIsItsPercentEncodedName) {

@@ -60,7 +60,8 @@ class LinuxUnderTest final : public KernelUnderTest {
  public:
   LinuxUnderTest() {
     const auto file = folder_.path() / "knob.conf";
-    Test::writeFile(file, "kernel = linux\nmax-vms = " + std::to_string(kMaxVms) + "\n");
+    Test::writeFile(file, "kernel = linux\nreserve-memory = 0\nreserve-cpu = 0\nmax-vms = " +
+                              std::to_string(kMaxVms) + "\n");
     ::setenv("KNOB_CONF", file.c_str(), 1);
     configuration_ = Knob::readConfiguration();
 

@@ -2,6 +2,7 @@
 // What a memory minimum is for: a pool keeps it when the machine is short of memory. The files are
 // sparse, so that reading them fills the page cache at once and needs no disk.
 #include <gtest/gtest.h>
+#include <sys/mount.h>
 #include <sys/sysinfo.h>
 
 #include <filesystem>
@@ -77,6 +78,20 @@ TEST_F(Protection, APoolThatWasDisabledAndEnabledKeepsItsMinimumAgain) {
   EXPECT_EQ(numberIn("host", "memory.min"), 0);
   ASSERT_TRUE(silentlyDone(world.poolctl({"enable", "host/opt/kept"})));
   EXPECT_GE(leftBesideGreedyNeighbour("host/opt/kept", "host/opt/greedy"), 0.95 * kMinimumMB);
+}
+
+// systemd mounts cgroup2 with it, the machine of these tests without.
+TEST_F(Protection, AMinimumProtectsChildPoolsOnlyWithRecursiveProtection) {
+  const auto remount = [](const char *option) {
+    return mount("none", kMount.c_str(), "cgroup2", MS_REMOUNT, option);
+  };
+  ASSERT_TRUE(silentlyDone(load("- name: a\n  memMin: 64\n- name: a/b\n- name: greedy\n")));
+  EXPECT_LT(leftBesideGreedyNeighbour("host/opt/a/b", "host/opt/greedy"), 0.5 * kMinimumMB);
+  EXPECT_EQ(world.run("knobctl", {"check"}).status, 1);
+  ASSERT_EQ(remount("memory_recursiveprot"), 0);
+  EXPECT_EQ(world.run("knobctl", {"check"}).status, 0);
+  EXPECT_GE(leftBesideGreedyNeighbour("host/opt/a/b", "host/opt/greedy"), 0.95 * kMinimumMB);
+  EXPECT_EQ(remount(""), 0);
 }
 
 // What Linux itself makes of some settings. A parent has memory of its own: the page cache of a

@@ -259,6 +259,7 @@ std::unique_ptr<Kernel> openNamed(const std::vector<std::string> &words, size_t 
   if (words.at(0) == "linux") {
     *used = 1;
     configuration.kernel = Knob::Configuration::KernelKind::kLinux;
+    configuration.reserve = {0, 0};  // as on the other kernel
     return Knob::openKernel(configuration);
   }
   *used = 4;

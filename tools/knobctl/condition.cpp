@@ -27,6 +27,7 @@ bool describeHost(const Knob::Configuration &configuration, Condition *condition
   condition->lines.emplace_back(
       "groups",
       host.path + "/host" + (host.hasGroups ? "" : " (none yet; the first use makes it)"));
+  for (const auto &[name, text] : host.account) condition->lines.emplace_back(name, text);
   for (const std::string &problem : host.problems) {
     condition->problem += (condition->problem.empty() ? "" : "; ") + problem;
   }

@@ -10,6 +10,7 @@
 #include <exception>
 #include <iostream>
 #include <memory>
+#include <optional>
 #include <string>
 
 #include "pool_membership.h"
@@ -48,6 +49,12 @@ int run(int argc, char **argv) {
   app.formatter(std::make_shared<UsageLine>());
   app.set_version_flag("--version", Tools::versionOf("poolctl-exec"), "Print the version and exit");
   app.add_option("POOL", pool, "A loaded pool: host/..., or NAME for host/opt/NAME")->required();
+  std::optional<int> oomScoreAdj;
+  app.add_option("--oom-score-adj", oomScoreAdj,
+                 "The command's oom_score_adj, instead of the one that the pool's memory minimum "
+                 "asks for")
+      ->check(CLI::Range(-1000, 1000))
+      ->type_name("N");
   app.footer(
       "Exit status: the command's own; 125 the pool could not be joined, or wrong usage;\n"
       "126 the command cannot be executed; 127 it was not found.");
@@ -65,6 +72,7 @@ int run(int argc, char **argv) {
 
   try {
     Exec::joinGroup(Exec::groupPath(pool));
+    if (oomScoreAdj) Exec::setOomScoreAdj(*oomScoreAdj);
   } catch (const std::exception &error) {
     return complain(error.what(), kOwnFailure);
   }

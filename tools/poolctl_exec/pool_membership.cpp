@@ -1,10 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "pool_membership.h"
 
+#include <fcntl.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstdint>
 #include <stdexcept>
+#include <system_error>
 
 #include "platform/knob.h"
 #include "platform/knob_records.h"
@@ -73,6 +76,18 @@ void joinGroup(const std::string &path) {
     refuse(path, "the pool has pools below it, so it takes no processes itself");
   if (status == KNOB_STATUS_OUT_OF_MEMORY) refuseDisabled(path);
   if (status != 0) refuse(path, NUC_ReturnStatusToString(status));
+}
+
+void setOomScoreAdj(int value) {
+  constexpr const char *kFile = "/proc/self/oom_score_adj";
+  const std::string text = std::to_string(value);
+  const int file = open(kFile, O_WRONLY | O_CLOEXEC);
+  const ssize_t count = file < 0 ? -1 : write(file, text.data(), text.size());
+  const int error = errno;
+  if (file >= 0) (void)close(file);  // the write has been reported already
+  if (count < 0) {
+    throw std::system_error(error, std::generic_category(), std::string(kFile) + ": " + text);
+  }
 }
 
 }  // namespace Exec

@@ -15,4 +15,8 @@ std::string groupPath(const std::string &pool);
 // what() names the group and the reason; the process has then not moved.
 void joinGroup(const std::string &path);
 
+// Gives the calling process an oom_score_adj, -1000 to 1000, which the command keeps. Throws
+// std::system_error.
+void setOomScoreAdj(int value);
+
 }  // namespace Exec

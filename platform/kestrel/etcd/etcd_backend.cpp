@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// What each operation asks of the cluster. Lookups are serializable reads of the run's revision;
-// what a change is based on is read from the present state, and the change is made only when that
-// has not changed meanwhile.
+// What each operation asks of the cluster. Reads for people and for changes are linearizable reads
+// of the present state. A change is made only when that state has not changed since.
 #include "kestrel/etcd/etcd_backend.h"
 
 #include <unistd.h>
@@ -13,36 +12,34 @@
 #include <tuple>
 
 #include "kestrel/errors.h"
+#include "kestrel/etcd/last_known_good.h"
 #include "kestrel/etcd/members.h"
 #include "kestrel/etcd/object_key.h"
 #include "kestrel/etcd/object_value.h"
+#include "kestrel/etcd/run_snapshot.h"
+#include "kestrel/text.h"
 
 namespace Kestrel::Etcd {
 
 namespace {
 
+using Freshness = Members::Freshness;
 using Milliseconds = std::chrono::milliseconds;
 
-// A change that others keep overtaking ends at the first of these.
-constexpr int kMostAttempts = 100;
-constexpr Milliseconds kMostTime{10000};
-constexpr int kMostPauseMs = 50;
+constexpr const char *kWhere = "etcd";
+
+// A change that other writers keep overtaking ends at the first of these.
+constexpr int kMaxAttempts = 100;
+constexpr Milliseconds kMaxTime{10000};
+constexpr int kMaxPauseMs = 50;
 
 constexpr int64_t kPageSize = 512;
-
-Fields fieldsOf(const KeyValue &pair) {
-  try {
-    return parseFields(pair.value);
-  } catch (const ValueError &error) {
-    throw storeError("etcd", pair.key, error.what());
-  }
-}
 
 std::string valueOf(const std::string &key, const Fields &fields) {
   try {
     return formatFields(fields);
   } catch (const ValueError &error) {
-    throw storeError("etcd", key, error.what());
+    throw storeError(kWhere, key, error.what());
   }
 }
 
@@ -56,203 +53,273 @@ bool before(const StoredObject &a, const StoredObject &b) {
 class EtcdBackend : public Backend {
  public:
   explicit EtcdBackend(const Configuration &configuration)
-      : prefix_(configuration.prefix), members_(configuration) {}
+      : configuration_(configuration),
+        members_(configuration_),
+        snapshot_(configuration_, members_) {}
+
+  std::optional<Fields> lookUp(const ObjectId &id) override { return snapshot_.lookUp(id); }
+  RunSource source() const override { return snapshot_.source(); }
 
   std::optional<Fields> read(const ObjectId &id) override {
-    RangeRequest request;
-    request.key = objectKey(prefix_, id);
-    const RangeAnswer answer = lookUp(std::move(request), Request::Kind::kRead);
-    if (answer.found.empty()) return std::nullopt;
-    return fieldsOf(answer.found.front());
+    std::optional<Fields> fields;
+    for (LayerFields &layer : layers(id)) {
+      if (!fields) fields.emplace();
+      fields->merge(layer.fields);  // keeps what an earlier layer has
+    }
+    return fields;
   }
 
-  std::vector<StoredObject> list(const Selection &selection) override {
-    RangeRequest request;
-    request.key = selectionKey(prefix_, selection);
-    request.end = endOfPrefix(request.key);
-    request.limit = kPageSize;
-    std::vector<StoredObject> objects;
-    while (takePage(&request, &objects)) {
+  std::vector<LayerFields> layers(const ObjectId &id) override {
+    ReadRequest request;
+    for (const std::string &prefix : configuration_.prefixes) {
+      request.ranges.push_back({objectKey(prefix, id), ""});
     }
-    std::sort(objects.begin(), objects.end(), before);
-    return objects;
+    const ReadResponse response = readNow(request, Members::kMaxResponseBytes);
+    std::vector<LayerFields> layers;
+    for (size_t i = 0; i < response.ranges.size(); ++i) {
+      for (const KeyValue &pair : response.ranges[i].found) {
+        layers.push_back({configuration_.prefixes[i], fieldsOf(pair.key, pair.value)});
+      }
+    }
+    return layers;
+  }
+
+  Listing list(const Selection &selection) override {
+    ReadRequest request;
+    const std::string key = selectionKey(onlyPrefix(), selection);
+    request.ranges = {{key, endOfPrefix(key)}};
+    request.limit = kPageSize;
+    Listing listing;
+    while (takePage(&request, &listing)) {
+    }
+    std::sort(listing.objects.begin(), listing.objects.end(), before);
+    return listing;
   }
 
   void setField(const ObjectId &id, const std::string &field, const Value &value) override {
-    change(objectKey(prefix_, id), [&](Fields *fields) {
-      (*fields)[field] = value;
+    change({objectKey(onlyPrefix(), id)}, [&](std::vector<Fields> *objects) {
+      objects->front()[field] = value;
       return true;
     });
   }
 
   bool removeField(const ObjectId &id, const std::string &field) override {
-    return change(objectKey(prefix_, id),
-                  [&](Fields *fields) { return fields->erase(field) != 0; });
+    return change({objectKey(onlyPrefix(), id)},
+                  [&](std::vector<Fields> *objects) { return objects->front().erase(field) != 0; });
+  }
+
+  bool move(const ObjectId &id, const std::string &from, const std::string &to) override {
+    return change({objectKey(from, id), objectKey(to, id)}, [](std::vector<Fields> *objects) {
+      Fields &source = objects->front(), &target = objects->back();
+      if (source.empty()) return false;
+      source.merge(target);  // keeps the fields that the source has
+      target = std::move(source);
+      source.clear();
+      return true;
+    });
   }
 
   bool removeObject(const ObjectId &id) override {
-    const std::string key = objectKey(prefix_, id);
+    const std::string key = objectKey(onlyPrefix(), id);
     int64_t deleted = 0;
-    members_.ask({Request::Kind::kChange, kDeletePath, deleteText(key), key},
-                 [&](const std::string &json) {
-                   deleted = readDeleted(json);
-                   if (deleted != 0) ownChange(readHeader(json));
-                 });
+    members_.change(kDeletePath, deleteText(key), key, [&](const std::string &json) {
+      deleted = readDeleted(json);
+      if (deleted != 0) continueFrom(readHeader(json));
+    });
     return deleted != 0;
   }
 
   void replace(const std::vector<StoredObject> &objects) override {
     if (objects.empty()) return;
-    // etcd takes a key once in a transaction; of an object that is given twice the last holds.
+    // etcd accepts a key once in a transaction; of an object that is given twice the last counts.
     std::map<std::string, std::string> values;
     for (const StoredObject &object : objects) {
-      const std::string key = objectKey(prefix_, object.id);
+      const std::string key = objectKey(onlyPrefix(), object.id);
       values[key] = valueOf(key, object.fields);
     }
     std::vector<KeyValue> pairs;
     pairs.reserve(values.size());
     for (auto &[key, value] : values) pairs.push_back({key, std::move(value), 0});
     const std::string subject = std::to_string(pairs.size()) + " objects in one transaction";
-    members_.ask({Request::Kind::kChange, kTransactionPath, putAllText(pairs), subject},
-                 [&](const std::string &json) { ownChange(readHeader(json)); });
+    members_.change(kTransactionPath, putAllText(pairs), subject,
+                    [&](const std::string &json) { continueFrom(readHeader(json)); });
   }
 
-  std::vector<Detail> details() override {
-    std::vector<Detail> details{{"prefix", prefix_}};
-    for (const std::string &endpoint : members_.endpoints()) {
-      details.emplace_back("member", endpoint + ": " + members_.condition(endpoint));
+  Health health() override {
+    Health health;
+    for (const std::string &prefix : configuration_.prefixes) {
+      health.details.emplace_back("prefix", prefix);
     }
-    return details;
+    for (const std::string &endpoint : members_.endpoints()) {
+      const Members::Health member = members_.health(endpoint);
+      health.details.emplace_back("member", endpoint + ": " + member.text);
+      if (!member.problem.empty()) health.problem = endpoint + ": " + member.problem;
+    }
+    health.details.emplace_back("last good", describeLastKnownGood());
+    try {
+      probe(&health);
+    } catch (const KestrelConfigStore::ConfigStoreException &error) {
+      health.readable = false;
+      health.problem = error.what();
+    }
+    return health;
   }
 
-  // What a run has learned holds to its end, above all that the store is gone.
+  // What a run has learned is kept to its end, above all that the store is gone.
   bool current() override { return true; }
 
  private:
-  // A read of the run's revision, or of the present one, which is then the run's.
-  RangeAnswer lookUp(RangeRequest request, Request::Kind kind) {
-    request.serializable = true;
-    request.revision = revision_;
-    const std::string subject = request.key;
-    RangeAnswer answer;
-    try {
-      members_.ask({kind, kRangePath, rangeText(request), subject}, [&](const std::string &json) {
-        answer = readRange(json);
-        check(answer.header);
-        check(request, answer);
-      });
-    } catch (const RequestRefused &refused) {
-      if (refused.why() != RequestRefused::Why::kCompacted) throw;
-      const std::string why =
-          "the cluster has forgotten revision " + std::to_string(revision_) + " of this run";
-      members_.giveUp(why);
-      throw storeError("etcd", subject, why);
-    }
-    if (revision_ == 0) revision_ = answer.header.revision;
-    return answer;
+  const std::string &onlyPrefix() const {
+    if (configuration_.prefixes.size() == 1) return configuration_.prefixes.front();
+    throw storeError(configuration_.file, "prefix",
+                     "names several layers; one of them must be chosen");
   }
 
-  // Members of one cluster have one history; another cluster's revision would mean nothing.
-  void check(const Header &header) {
-    if (header.revision < 1) throw ProtocolError("without a revision");
-    if (!cluster_.empty() && header.cluster != cluster_) {
-      throw ProtocolError("the member belongs to another cluster");
-    }
-    cluster_ = header.cluster;
+  void continueFrom(const Header &header) {
+    members_.checkCluster(header);
+    snapshot_.continueFrom(header);
   }
 
-  static void check(const RangeRequest &request, const RangeAnswer &answer) {
-    for (const KeyValue &pair : answer.found) {
-      const bool asked = request.end.empty() ? pair.key == request.key
-                                             : pair.key >= request.key && pair.key < request.end;
-      if (!asked) throw ProtocolError("with a key that was not asked for");
-    }
+  // Reads the present state, which the cluster agrees on.
+  ReadResponse readNow(const ReadRequest &request, size_t maxBytes,
+                       Freshness allowed = Freshness::kCurrent, Freshness *freshness = nullptr) {
+    ReadResponse response;
+    const Freshness found =
+        members_.read(request, request.ranges.front().key, allowed,
+                      Deadline(configuration_.timeout), maxBytes, [&](const std::string &json) {
+                        ReadResponse read = readResponse(request, json);
+                        members_.checkCluster(read.header);
+                        response = std::move(read);
+                      });
+    if (freshness != nullptr) *freshness = found;
+    return response;
   }
 
-  // false: this was the last page. The next one begins behind the last key of this one.
-  bool takePage(RangeRequest *request, std::vector<StoredObject> *objects) {
-    const RangeAnswer answer = [&] {
+  // false: this was the last page. The next one begins after the last key of this one, and is read
+  // at the revision of the first.
+  bool takePage(ReadRequest *request, Listing *listing) {
+    const ReadResponse response = [&] {
       for (;;) {
         try {
-          return lookUp(*request, Request::Kind::kPage);
+          return readNow(*request, Members::kMaxResponseBytes);
         } catch (const RequestRefused &refused) {
-          if (refused.why() != RequestRefused::Why::kTooLargeAnswer || request->limit == 1) throw;
+          if (refused.why() != RequestRefused::Why::kTooLarge || request->limit == 1) throw;
           request->limit /= 2;
         }
       }
     }();
-    for (const KeyValue &pair : answer.found) {
-      auto id = objectId(prefix_, pair.key);
-      if (!id) throw storeError("etcd", pair.key, "the key is no object's");
-      objects->push_back({std::move(*id), fieldsOf(pair)});
-    }
-    if (!answer.more || answer.found.empty()) return false;
-    request->key = answer.found.back().key + '\0';
+    request->revision = response.header.revision;
+    const FoundRange &range = response.ranges.front();
+    for (const KeyValue &pair : range.found) takeObject(pair, listing);
+    if (!range.more || range.found.empty()) return false;
+    request->ranges.front().key = range.found.back().key + '\0';
     return true;
   }
 
-  // A run that changes the store goes on from its own change.
-  void ownChange(const Header &header) {
-    check(header);
-    if (revision_ != 0) revision_ = header.revision;
+  void takeObject(const KeyValue &pair, Listing *listing) const {
+    auto id = objectId(onlyPrefix(), pair.key);
+    if (!id) {
+      listing->damaged.push_back({pair.key, "the key is not that of an object"});
+      return;
+    }
+    try {
+      listing->objects.push_back({std::move(*id), parseFields(pair.value)});
+    } catch (const ValueError &error) {
+      listing->damaged.push_back({pair.key, error.what()});
+    }
   }
 
-  std::optional<KeyValue> present(const std::string &key) {
-    RangeRequest request;
-    request.key = key;
-    RangeAnswer answer;
-    members_.ask({Request::Kind::kRead, kRangePath, rangeText(request), key},
-                 [&](const std::string &json) {
-                   answer = readRange(json);
-                   check(answer.header);
-                   check(request, answer);
-                 });
-    if (answer.found.empty()) return std::nullopt;
-    return std::move(answer.found.front());
+  // Reads as a run does, so that its failures are those of a run. A role that does not allow the
+  // whole prefix is enough for a run.
+  void probe(Health *health) {
+    ReadRequest request;
+    for (const std::string &prefix : configuration_.prefixes) {
+      const std::string key = selectionKey(prefix, {});
+      request.ranges.push_back({key, endOfPrefix(key)});
+    }
+    request.limit = 1;
+    try {
+      Freshness freshness = Freshness::kCurrent;
+      const auto response =
+          readNow(request, Members::kMaxResponseBytes, Freshness::kAny, &freshness);
+      health->details.emplace_back("revision", std::to_string(response.header.revision));
+      if (freshness == Freshness::kCurrent) return;
+      health->problem = "no quorum: values may be old, and no change is accepted";
+    } catch (const RequestRefused &refused) {
+      if (refused.why() != RequestRefused::Why::kPermission) throw;
+      health->details.emplace_back(
+          "permission", "not for the whole prefix: each component and group is read alone");
+    }
   }
 
-  // Compare and swap: makes the change on what the key holds, as long as nobody else changes it in
-  // between; otherwise begins anew with what it holds then. apply: false when there is nothing to
-  // change. An object goes with its last field.
+  std::string describeLastKnownGood() const {
+    StoredValues values;
+    std::string why;
+    if (!LastKnownGood(configuration_).read(&values, &why)) return "cannot be used: " + why;
+    return "revision " + std::to_string(values.revision) + ", read " + inUtc(values.time) + ", " +
+           std::to_string(values.values.size()) + " objects";
+  }
+
+  std::vector<std::optional<KeyValue>> present(const std::vector<std::string> &keys) {
+    ReadRequest request;
+    for (const std::string &key : keys) request.ranges.push_back({key, ""});
+    ReadResponse response = readNow(request, Members::kMaxResponseBytes);
+    std::vector<std::optional<KeyValue>> found;
+    for (FoundRange &range : response.ranges) {
+      found.emplace_back();
+      if (!range.found.empty()) found.back() = std::move(range.found.front());
+    }
+    return found;
+  }
+
+  // Compare and swap: makes the change on what the keys hold, if no other writer has changed them
+  // since they were read; otherwise begins again with what they hold then. apply: false when there
+  // is nothing to change. An object is deleted with its last field.
   template <typename Apply>
-  bool change(const std::string &key, const Apply &apply) {
-    const Deadline deadline(kMostTime);
-    std::optional<KeyValue> found = present(key);
+  bool change(const std::vector<std::string> &keys, const Apply &apply) {
+    const Deadline deadline(kMaxTime);
+    std::vector<std::optional<KeyValue>> found = present(keys);
     for (int attempt = 1;; ++attempt) {
-      Fields fields = found ? fieldsOf(*found) : Fields{};
-      if (!apply(&fields)) return false;
-      ChangeRequest request{key, found ? found->modRevision : 0, std::nullopt};
-      if (!fields.empty()) request.value = valueOf(key, fields);
-      ChangeAnswer answer = send(request);
-      if (answer.done) return true;
-      if (attempt == kMostAttempts || deadline.passed()) {
-        throw storeError("etcd", key, "others keep changing it; nothing was changed");
+      std::vector<Fields> objects;
+      for (const auto &pair : found) {
+        objects.push_back(pair ? fieldsOf(pair->key, pair->value) : Fields{});
       }
-      found = std::move(answer.found);
+      if (!apply(&objects)) return false;
+      std::vector<KeyChange> changes;
+      for (size_t i = 0; i < keys.size(); ++i) {
+        changes.push_back({keys[i], found[i] ? found[i]->modRevision : 0, std::nullopt});
+        if (!objects[i].empty()) changes.back().value = valueOf(keys[i], objects[i]);
+      }
+      ChangeResponse response = send(changes);
+      if (response.done) return true;
+      if (attempt == kMaxAttempts || deadline.passed()) {
+        throw storeError(kWhere, keys.front(),
+                         "other writers keep changing it; nothing was changed");
+      }
+      found = std::move(response.found);
       std::this_thread::sleep_for(pauseAfter(attempt));
     }
   }
 
   // Writers that met once should not meet again.
   Milliseconds pauseAfter(int attempt) {
-    const int most = std::min(1 << std::min(attempt, 10), kMostPauseMs);
-    return Milliseconds(std::uniform_int_distribution<int>(0, most)(random_));
+    const int longest = std::min(1 << std::min(attempt, 10), kMaxPauseMs);
+    return Milliseconds(std::uniform_int_distribution<int>(0, longest)(random_));
   }
 
-  ChangeAnswer send(const ChangeRequest &request) {
-    ChangeAnswer answer;
-    members_.ask({Request::Kind::kChange, kTransactionPath, changeText(request), request.key},
-                 [&](const std::string &json) {
-                   answer = readChange(json);
-                   if (answer.done) ownChange(answer.header);
-                 });
-    return answer;
+  ChangeResponse send(const std::vector<KeyChange> &changes) {
+    ChangeResponse response;
+    members_.change(kTransactionPath, changeText(changes), changes.front().key,
+                    [&](const std::string &json) {
+                      response = readChange(changes.size(), json);
+                      if (response.done) continueFrom(response.header);
+                    });
+    return response;
   }
 
-  std::string prefix_;
+  const Configuration configuration_;
   Members members_;
-  std::string cluster_;   // empty: none has answered yet
-  int64_t revision_ = 0;  // 0: likewise
+  RunSnapshot snapshot_;
   std::minstd_rand random_{
       static_cast<unsigned>(getpid()) ^
       static_cast<unsigned>(Deadline::Clock::now().time_since_epoch().count())};

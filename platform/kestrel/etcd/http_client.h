@@ -1,69 +1,94 @@
 // SPDX-License-Identifier: Apache-2.0
-// HTTP requests over one kept connection for each server: what is asked of libcurl, and nothing of
-// etcd. The environment is not consulted, redirects are not followed, certificates are verified.
+// HTTP requests, several at the same time, with one kept connection for each server: how libcurl is
+// used, and nothing of etcd. The environment is not consulted, redirects are not followed,
+// certificates are verified.
 #pragma once
 
 #include <curl/curl.h>
 
-#include <array>
 #include <chrono>
 #include <cstddef>
 #include <memory>
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "kestrel/configuration.h"
+#include "kestrel/etcd/deadline.h"
 
 namespace Kestrel::Etcd {
 
-struct HttpAnswer {
+struct HttpRequest {
+  std::string url;
+  std::string json;   // the body
+  std::string token;  // for the Authorization header; empty: none
+  // The longest time until there is a connection, and in all.
+  std::chrono::milliseconds connect{0}, whole{0};
+  size_t maxBytes = 0;  // the largest body that is accepted
+
+  // Sends the request on a new connection and then closes it. On a kept connection libcurl sends a
+  // request a second time when the connection breaks before the first byte of the response, which
+  // would make a change twice.
+  bool once = false;
+};
+
+struct HttpResponse {
   enum class End {
-    kAnswered,    // status and body hold
-    kNotReached,  // the server got nothing of the request
-    kNoAnswer,    // the server may have acted on the request
-    kTooLarge,    // the body is larger than the caller takes
+    kCompleted,  // status and body are valid
+    kFailed,     // no connection, or no whole response in time
+    kTooLarge,   // the body is larger than the request accepts
+    kUntrusted,  // one side does not accept the other's certificate, or its own is unusable
   };
 
-  End end = End::kNotReached;
+  End end = End::kFailed;
   long status = 0;
   std::string body;
-  std::string problem;  // why there is no answer, in words
+  bool sent = false;    // the server may have received the request, and acted on it
+  std::string problem;  // why there is no response, in words
 };
 
-// How long an exchange may take: until there is a connection, and in all.
-struct TimeLimits {
-  std::chrono::milliseconds connect, whole;
-};
-
-// Not for two threads at once.
+// One thread at a time.
 class HttpClient {
  public:
-  // Throws a ConfigStoreException when a file of the TLS settings cannot be read, or when libcurl
+  using Id = size_t;
+
+  struct Finished {
+    Id id;
+    HttpResponse response;
+  };
+
+  // Throws a ConfigStoreException when a file of the TLS settings cannot be used, or when libcurl
   // cannot be used.
   explicit HttpClient(const Configuration &configuration);
+  HttpClient(const HttpClient &) = delete;
+  HttpClient &operator=(const HttpClient &) = delete;
+  ~HttpClient();
 
-  // Sends a JSON text and waits for the whole answer. token: for the Authorization header; empty:
-  // none. mostBytes: the largest body that is taken.
-  HttpAnswer post(const std::string &url, const std::string &json, const std::string &token,
-                  TimeLimits limits, size_t mostBytes);
+  // Begins to send a request, and returns without waiting.
+  Id start(HttpRequest request);
+
+  // Waits for the next request to end. Empty: the deadline passed, or no request is under way.
+  std::optional<Finished> wait(const Deadline &until);
+
+  // Gives up all requests that are under way and closes their connections.
+  void cancelAll();
+
+  // Sends one request and waits for its end. No other request may be under way.
+  HttpResponse post(HttpRequest request);
 
  private:
-  struct HandleDeleter {
-    void operator()(CURL *handle) const { curl_easy_cleanup(handle); }
-  };
-  struct ListDeleter {
-    void operator()(curl_slist *list) const { curl_slist_free_all(list); }
+  struct Exchange;
+  struct MultiDeleter {
+    void operator()(CURLM *handle) const { curl_multi_cleanup(handle); }
   };
 
-  void configure();
-  void configureTls(const Configuration &configuration);
-  void setHeaders(const std::string &token);
-  HttpAnswer interpret(CURLcode result, bool tooLarge) const;
+  std::optional<Finished> takeFinished();
 
-  std::array<char, CURL_ERROR_SIZE> errorText_{};
-  std::string token_;
-  // The handle refers to the headers and to the text: it goes first.
-  std::unique_ptr<curl_slist, ListDeleter> headers_;
-  std::unique_ptr<CURL, HandleDeleter> handle_;
+  std::string cacert_, cert_, key_;
+  // The exchanges leave the multi handle before it goes: they are declared after it.
+  std::unique_ptr<CURLM, MultiDeleter> multi_;
+  std::vector<std::unique_ptr<Exchange>> exchanges_;
+  Id nextId_ = 1;
 };
 
 }  // namespace Kestrel::Etcd

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The coding of ids as keys, and nothing of how they are asked for.
+// How ids are written as keys. How keys are read from a server is not part of it.
 #include "kestrel/etcd/object_key.h"
 
 #include <vector>
@@ -8,8 +8,8 @@ namespace Kestrel::Etcd {
 
 namespace {
 
-// The name space whose values hold for the whole host, as programs ask for it
-// (KestrelConfigStore::sGlobalNamespace); a module has nothing of that library but its headers.
+// KestrelConfigStore::sGlobalNamespace. The module links nothing of that library and has only its
+// headers.
 constexpr const char *kNamespace = "global";
 constexpr size_t kParts = 3;  // component, group and key
 
@@ -23,10 +23,6 @@ int hexDigit(char c) {
   if (c >= 'A' && c <= 'F') return c - 'A' + 10;
   if (c >= 'a' && c <= 'f') return c - 'a' + 10;
   return -1;
-}
-
-std::string root(const std::string &prefix) {
-  return prefix + "/" + kNamespace + "/";
 }
 
 std::optional<std::vector<std::string>> decodedParts(std::string_view text) {
@@ -73,15 +69,23 @@ std::optional<std::string> percentDecode(std::string_view text) {
   return decoded;
 }
 
+std::string keyRoot(const std::string &prefix) {
+  return prefix + "/" + kNamespace + "/";
+}
+
+std::string objectPart(const ObjectId &id) {
+  std::string part =
+      percentEncode(id.component) + "/" + percentEncode(id.group) + "/" + percentEncode(id.key);
+  if (!id.extra.empty()) part += "/" + percentEncode(id.extra);
+  return part;
+}
+
 std::string objectKey(const std::string &prefix, const ObjectId &id) {
-  std::string key = root(prefix) + percentEncode(id.component) + "/" + percentEncode(id.group) +
-                    "/" + percentEncode(id.key);
-  if (!id.extra.empty()) key += "/" + percentEncode(id.extra);
-  return key;
+  return keyRoot(prefix) + objectPart(id);
 }
 
 std::optional<ObjectId> objectId(const std::string &prefix, const std::string &key) {
-  const std::string start = root(prefix);
+  const std::string start = keyRoot(prefix);
   if (key.compare(0, start.size(), start) != 0) return std::nullopt;
   const auto parts = decodedParts(std::string_view(key).substr(start.size()));
   if (!parts || parts->size() < kParts || parts->size() > kParts + 1) return std::nullopt;
@@ -90,17 +94,19 @@ std::optional<ObjectId> objectId(const std::string &prefix, const std::string &k
   id.group = (*parts)[1];
   id.key = (*parts)[2];
   if (parts->size() > kParts) id.extra = (*parts)[kParts];
-  // Lower-case digits, needless coding and an empty EXTRA are other keys than the object's.
+  // Lower-case digits, needless encoding and an empty EXTRA make other keys than the object's.
   if (objectKey(prefix, id) != key) return std::nullopt;
   return id;
 }
 
+std::string selectionPart(const Selection &selection) {
+  if (!selection.component) return "";
+  const std::string part = percentEncode(*selection.component) + "/";
+  return selection.group ? part + percentEncode(*selection.group) + "/" : part;
+}
+
 std::string selectionKey(const std::string &prefix, const Selection &selection) {
-  std::string key = root(prefix);
-  if (!selection.component) return key;
-  key += percentEncode(*selection.component) + "/";
-  if (!selection.group) return key;
-  return key + percentEncode(*selection.group) + "/";
+  return keyRoot(prefix) + selectionPart(selection);
 }
 
 std::string endOfPrefix(std::string prefix) {

@@ -1,12 +1,15 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reading is event by event and stops at the first thing that no field can hold, so neither depth
-// nor a number's size is ever a matter of the JSON library's own rounding.
+// The value is read from the JSON library's events, and reading stops at the first one that no
+// field can hold. So depth is limited, and a number that does not fit is refused instead of
+// rounded.
 #include "kestrel/etcd/object_value.h"
 
 #include <cmath>
 #include <cstdint>
 #include <limits>
 #include <nlohmann/json.hpp>
+
+#include "kestrel/errors.h"
 
 namespace Kestrel::Etcd {
 
@@ -27,7 +30,7 @@ class FieldReader : public nlohmann::json_sax<Json> {
     return add(static_cast<int64_t>(value));
   }
 
-  // Whole numbers beyond the library's integers come here too; their text tells.
+  // Integers beyond 64 bits arrive here too; their text has neither '.' nor an exponent.
   bool number_float(number_float_t value, const string_t &text) override {
     if (text.find_first_of(".eE") == text.npos) refuseSize();
     if (!std::isfinite(value)) refuse("is out of a real number's range");
@@ -56,12 +59,12 @@ class FieldReader : public nlohmann::json_sax<Json> {
   bool parse_error(size_t position, const std::string &, const Json::exception &error) override {
     constexpr int kNumberOutOfRange = 406;
     if (error.id == kNumberOutOfRange) refuse("is out of a real number's range");
-    throw ValueError("the value is no JSON: unreadable at byte " + std::to_string(position));
+    throw ValueError("the value is not JSON: unreadable at byte " + std::to_string(position));
   }
 
  private:
   bool add(Value value) {
-    if (!inObject_) throw ValueError("the value is no JSON object");
+    if (!inObject_) throw ValueError("the value is not a JSON object");
     fields_.emplace(name_, std::move(value));
     return true;
   }
@@ -69,7 +72,7 @@ class FieldReader : public nlohmann::json_sax<Json> {
   [[noreturn]] void refuseSize() { refuse("is an integer that does not fit into 64 bits"); }
 
   [[noreturn]] void refuse(const char *why) {
-    if (!inObject_) throw ValueError("the value is no JSON object");
+    if (!inObject_) throw ValueError("the value is not a JSON object");
     throw ValueError("field \"" + name_ + "\" " + why);
   }
 
@@ -102,6 +105,14 @@ Fields parseFields(std::string_view json) {
   FieldReader reader;
   Json::sax_parse(json.begin(), json.end(), &reader);
   return reader.takeFields();
+}
+
+Fields fieldsOf(const std::string &key, std::string_view json) {
+  try {
+    return parseFields(json);
+  } catch (const ValueError &error) {
+    throw storeError("etcd", key, error.what());
+  }
 }
 
 std::string formatFields(const Fields &fields) {

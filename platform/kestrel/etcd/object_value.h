@@ -14,6 +14,9 @@ namespace Kestrel::Etcd {
 // integer beyond 64 bits, a real number beyond its range, a member given twice.
 Fields parseFields(std::string_view json);
 
+// The same, for the value of a key. Throws a ConfigStoreException that names the key.
+Fields fieldsOf(const std::string &key, std::string_view json);
+
 // Throws ValueError for what JSON has no form for: infinities, not-a-number, and bytes that are not
 // UTF-8.
 std::string formatFields(const Fields &fields);

@@ -16,7 +16,7 @@ namespace Kestrel::Etcd {
 
 namespace {
 
-constexpr size_t kMostBytes = 4096;
+constexpr size_t kMaxBytes = 4096;
 
 KestrelConfigStore::ConfigStoreException refusal(const std::string &path, const std::string &why) {
   return storeError(path, "the password file", why);
@@ -27,7 +27,7 @@ KestrelConfigStore::ConfigStoreException systemRefusal(const std::string &path, 
 }
 
 std::string readAll(int fd, const std::string &path) {
-  std::array<char, kMostBytes + 1> buffer{};
+  std::array<char, kMaxBytes + 1> buffer{};
   size_t size = 0;
   while (size < buffer.size()) {
     const ssize_t count = ::read(fd, buffer.data() + size, buffer.size() - size);
@@ -36,7 +36,7 @@ std::string readAll(int fd, const std::string &path) {
     if (count == 0) break;
     size += static_cast<size_t>(count);
   }
-  if (size > kMostBytes) throw refusal(path, "is larger than 4096 bytes");
+  if (size > kMaxBytes) throw refusal(path, "is larger than 4096 bytes");
   return std::string(buffer.data(), size);
 }
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The password of etcd's user, from a file that nobody but its owner may touch.
+// The password of etcd's user, from a file that only its owner may read or write.
 #pragma once
 
 #include <string>

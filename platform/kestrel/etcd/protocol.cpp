@@ -1,18 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
-// Requests are put together by hand, for every part of them is base64 or a number; answers are
-// foreign text and are read with care.
+// Requests are written by hand, since each part of them is base64 or a number. Responses are
+// untrusted text, and each member's kind is checked.
 #include "kestrel/etcd/protocol.h"
 
 #include <charconv>
 #include <nlohmann/json.hpp>
 
 #include "kestrel/etcd/base64.h"
+#include "kestrel/text.h"
 
 namespace Kestrel::Etcd {
 
 namespace {
 
-using Json = nlohmann::json;
+using Kind = JsonTree::Kind;
 
 std::string member(const char *name, const std::string &bytes) {
   return std::string("\"") + name + "\":\"" + toBase64(bytes) + "\"";
@@ -26,115 +27,136 @@ std::string putText(const std::string &key, const std::string &value) {
   return "{\"request_put\":{" + member("key", key) + "," + member("value", value) + "}}";
 }
 
-// No answer of etcd's is deeper than this. Foreign text without end must not become a tree of it.
-constexpr int kMostDepth = 16;
-
-// Discarded: not JSON.
-Json parse(const std::string &json) {
-  const auto limitDepth = [](int depth, Json::parse_event_t, const Json &) {
-    if (depth > kMostDepth) throw ProtocolError("nested too deeply");
-    return true;
-  };
-  return Json::parse(json, limitDepth, false);
-}
-
-Json parseObject(const std::string &json) {
-  Json parsed = parse(json);
-  if (parsed.is_discarded()) throw ProtocolError("not JSON");
-  if (!parsed.is_object()) throw ProtocolError("no JSON object");
-  return parsed;
-}
-
-// Null: left out.
-const Json *find(const Json &object, const char *name) {
-  const auto found = object.find(name);
-  return found == object.end() || found->is_null() ? nullptr : &*found;
-}
-
-const Json *findOf(const Json &object, const char *name, Json::value_t type) {
-  const Json *found = find(object, name);
-  if (found != nullptr && found->type() != type) {
-    throw ProtocolError(std::string("\"") + name + "\" is of another kind than expected");
-  }
-  return found;
-}
-
-std::string text(const Json &object, const char *name) {
-  const Json *found = findOf(object, name, Json::value_t::string);
-  return found == nullptr ? "" : found->get_ref<const std::string &>();
-}
-
-std::string bytes(const Json &object, const char *name) {
-  auto decoded = fromBase64(text(object, name));
-  if (!decoded) throw ProtocolError(std::string("\"") + name + "\" is no base64");
-  return std::move(*decoded);
-}
-
-int64_t number(const Json &object, const char *name) {
-  const std::string digits = text(object, name);
-  if (digits.empty()) return 0;
-  int64_t value = 0;
-  const char *end = digits.data() + digits.size();
-  const auto result = std::from_chars(digits.data(), end, value);
-  if (result.ec != std::errc() || result.ptr != end || value < 0) {
-    throw ProtocolError(std::string("\"") + name + "\" is no number");
-  }
-  return value;
-}
-
-bool truth(const Json &object, const char *name) {
-  const Json *found = findOf(object, name, Json::value_t::boolean);
-  return found != nullptr && found->get<bool>();
-}
-
-Header headerOf(const Json &answer) {
-  const Json *header = findOf(answer, "header", Json::value_t::object);
-  if (header == nullptr) throw ProtocolError("without a \"header\"");
-  return {text(*header, "cluster_id"), number(*header, "revision")};
-}
-
-std::vector<KeyValue> keyValues(const Json &range) {
-  std::vector<KeyValue> found;
-  const Json *list = findOf(range, "kvs", Json::value_t::array);
-  if (list == nullptr) return found;
-  for (const Json &entry : *list) {
-    if (!entry.is_object()) throw ProtocolError("\"kvs\" is of another kind than expected");
-    found.push_back({bytes(entry, "key"), bytes(entry, "value"), number(entry, "mod_revision")});
-  }
-  return found;
-}
-
-// The one range of a transaction that was not made.
-std::optional<KeyValue> foundInstead(const Json &answer) {
-  const Json *responses = findOf(answer, "responses", Json::value_t::array);
-  if (responses == nullptr || responses->size() != 1 || !responses->front().is_object()) {
-    throw ProtocolError("without what the key holds");
-  }
-  const Json *range = findOf(responses->front(), "response_range", Json::value_t::object);
-  if (range == nullptr) throw ProtocolError("without what the key holds");
-  auto found = keyValues(*range);
-  if (found.empty()) return std::nullopt;
-  return std::move(found.front());
-}
-
-}  // namespace
-
-std::string rangeText(const RangeRequest &request) {
-  std::string json = "{" + member("key", request.key);
-  if (!request.end.empty()) json += "," + member("range_end", request.end);
+std::string rangeText(const KeyRange &range, const ReadRequest &request) {
+  std::string json = "{" + member("key", range.key);
+  if (!range.end.empty()) json += "," + member("range_end", range.end);
   if (request.limit != 0) json += "," + member("limit", request.limit);
   if (request.revision != 0) json += "," + member("revision", request.revision);
   if (request.serializable) json += ",\"serializable\":true";
   return json + "}";
 }
 
-std::string changeText(const ChangeRequest &request) {
-  const std::string key = "{" + member("key", request.key) + "}";
-  const std::string change = request.value ? putText(request.key, *request.value)
-                                           : "{\"request_delete_range\":" + key + "}";
-  return "{\"compare\":[{" + member("key", request.key) +
-         ",\"target\":\"MOD\",\"result\":\"EQUAL\"," + member("mod_revision", request.modRevision) +
-         "}],\"success\":[" + change + "],\"failure\":[{\"request_range\":" + key + "}]}";
+JsonTree parseObject(const std::string &json) {
+  JsonTree parsed = parseJson(json);
+  if (parsed.kind != Kind::kObject) throw ProtocolError("not a JSON object");
+  return parsed;
+}
+
+// Null: left out.
+const JsonTree *find(const JsonTree &object, const char *name, Kind kind) {
+  const JsonTree *found = object.find(name);
+  if (found != nullptr && found->kind != kind) {
+    throw ProtocolError(std::string("\"") + name + "\" is of another kind than expected");
+  }
+  return found;
+}
+
+std::string text(const JsonTree &object, const char *name) {
+  const JsonTree *found = find(object, name, Kind::kText);
+  return found == nullptr ? "" : found->text;
+}
+
+std::string bytes(const JsonTree &object, const char *name) {
+  auto decoded = fromBase64(text(object, name));
+  if (!decoded) throw ProtocolError(std::string("\"") + name + "\" is not base64");
+  return std::move(*decoded);
+}
+
+int64_t number(const JsonTree &object, const char *name) {
+  const std::string digits = text(object, name);
+  if (digits.empty()) return 0;
+  int64_t value = 0;
+  const char *end = digits.data() + digits.size();
+  const auto result = std::from_chars(digits.data(), end, value);
+  if (result.ec != std::errc() || result.ptr != end || value < 0) {
+    throw ProtocolError(std::string("\"") + name + "\" is not a number");
+  }
+  return value;
+}
+
+bool truth(const JsonTree &object, const char *name) {
+  const JsonTree *found = find(object, name, Kind::kBoolean);
+  return found != nullptr && found->truth;
+}
+
+Header headerOf(const JsonTree &response) {
+  const JsonTree *header = find(response, "header", Kind::kObject);
+  if (header == nullptr) throw ProtocolError("without a \"header\"");
+  return {text(*header, "cluster_id"), number(*header, "revision")};
+}
+
+FoundRange foundRange(const JsonTree &range) {
+  FoundRange result;
+  result.more = truth(range, "more");
+  const JsonTree *list = find(range, "kvs", Kind::kArray);
+  if (list == nullptr) return result;
+  result.found.reserve(list->items.size());
+  for (const JsonTree &entry : list->items) {
+    if (entry.kind != Kind::kObject) {
+      throw ProtocolError("\"kvs\" is of another kind than expected");
+    }
+    result.found.push_back(
+        {bytes(entry, "key"), bytes(entry, "value"), number(entry, "mod_revision")});
+  }
+  return result;
+}
+
+// The ranges that a transaction returns.
+std::vector<FoundRange> transactionRanges(const JsonTree &response, size_t expected) {
+  const JsonTree *responses = find(response, "responses", Kind::kArray);
+  if (responses == nullptr || responses->items.size() != expected) {
+    throw ProtocolError("without the ranges that were asked for");
+  }
+  std::vector<FoundRange> ranges;
+  for (const JsonTree &entry : responses->items) {
+    const JsonTree *range =
+        entry.kind == Kind::kObject ? find(entry, "response_range", Kind::kObject) : nullptr;
+    if (range == nullptr) throw ProtocolError("without the ranges that were asked for");
+    ranges.push_back(foundRange(*range));
+  }
+  return ranges;
+}
+
+void checkAsked(const KeyRange &asked, const FoundRange &range) {
+  for (const KeyValue &pair : range.found) {
+    const bool inside =
+        asked.end.empty() ? pair.key == asked.key : pair.key >= asked.key && pair.key < asked.end;
+    if (!inside) throw ProtocolError("with a key that was not asked for");
+  }
+}
+
+}  // namespace
+
+const char *readPath(const ReadRequest &request) {
+  return request.ranges.size() == 1 ? kRangePath : kTransactionPath;
+}
+
+std::string readText(const ReadRequest &request) {
+  if (request.ranges.size() == 1) return rangeText(request.ranges.front(), request);
+  std::string ranges;
+  for (const KeyRange &range : request.ranges) {
+    if (!ranges.empty()) ranges += ",";
+    ranges += "{\"request_range\":" + rangeText(range, request) + "}";
+  }
+  return "{\"success\":[" + ranges + "]}";
+}
+
+std::string changeText(const std::vector<KeyChange> &changes) {
+  std::string compares, operations, ranges;
+  const auto append = [](std::string *list, const std::string &entry) {
+    *list += (list->empty() ? "" : ",") + entry;
+  };
+  for (const KeyChange &change : changes) {
+    const std::string key = "{" + member("key", change.key) + "}";
+    append(&compares, "{" + member("key", change.key) +
+                          ",\"target\":\"MOD\",\"result\":\"EQUAL\"," +
+                          member("mod_revision", change.modRevision) + "}");
+    append(&operations, change.value ? putText(change.key, *change.value)
+                                     : "{\"request_delete_range\":" + key + "}");
+    append(&ranges, "{\"request_range\":" + key + "}");
+  }
+  return "{\"compare\":[" + compares + "],\"success\":[" + operations + "],\"failure\":[" + ranges +
+         "]}";
 }
 
 std::string putAllText(const std::vector<KeyValue> &pairs) {
@@ -151,20 +173,34 @@ std::string deleteText(const std::string &key) {
 }
 
 std::string authenticateText(const std::string &user, const std::string &password) {
-  const Json json = {{"name", user}, {"password", password}};
-  return json.dump(-1, ' ', false, Json::error_handler_t::replace);
+  const nlohmann::json json = {{"name", user}, {"password", password}};
+  return json.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
 }
 
-RangeAnswer readRange(const std::string &json) {
-  const Json answer = parseObject(json);
-  return {headerOf(answer), keyValues(answer), truth(answer, "more")};
+ReadResponse readResponse(const ReadRequest &request, const std::string &json) {
+  const JsonTree tree = parseObject(json);
+  ReadResponse response{headerOf(tree), {}};
+  if (response.header.revision < 1) throw ProtocolError("without a revision");
+  if (request.ranges.size() == 1) {
+    response.ranges.push_back(foundRange(tree));
+  } else {
+    response.ranges = transactionRanges(tree, request.ranges.size());
+  }
+  for (size_t i = 0; i < request.ranges.size(); ++i) {
+    checkAsked(request.ranges[i], response.ranges[i]);
+  }
+  return response;
 }
 
-ChangeAnswer readChange(const std::string &json) {
-  const Json answer = parseObject(json);
-  ChangeAnswer result{headerOf(answer), truth(answer, "succeeded"), std::nullopt};
-  if (!result.done) result.found = foundInstead(answer);
-  return result;
+ChangeResponse readChange(size_t changes, const std::string &json) {
+  const JsonTree tree = parseObject(json);
+  ChangeResponse response{headerOf(tree), truth(tree, "succeeded"), {}};
+  if (response.done) return response;
+  for (FoundRange &range : transactionRanges(tree, changes)) {
+    response.found.emplace_back();
+    if (!range.found.empty()) response.found.back() = std::move(range.found.front());
+  }
+  return response;
 }
 
 Header readHeader(const std::string &json) {
@@ -172,35 +208,43 @@ Header readHeader(const std::string &json) {
 }
 
 int64_t readDeleted(const std::string &json) {
-  const Json answer = parseObject(json);
-  (void)headerOf(answer);
-  return number(answer, "deleted");
+  const JsonTree response = parseObject(json);
+  (void)headerOf(response);
+  return number(response, "deleted");
 }
 
 std::string readToken(const std::string &json) {
   std::string token = text(parseObject(json), "token");
-  // It becomes a line of a header.
+  // It becomes a line of an HTTP header.
   if (token.empty() || token.find_first_of("\r\n") != token.npos) {
     throw ProtocolError("without a usable \"token\"");
   }
   return token;
 }
 
-StatusAnswer readStatus(const std::string &json) {
-  const Json answer = parseObject(json);
-  const std::string leader = text(answer, "leader");  // a member's id, of 64 bits without a sign
-  return {headerOf(answer), text(answer, "version"), !leader.empty() && leader != "0"};
+StatusResponse readStatus(const std::string &json) {
+  const JsonTree response = parseObject(json);
+  const std::string leader = text(response, "leader");  // a member's id: 64 bits without a sign
+  StatusResponse status{
+      headerOf(response), text(response, "version"), !leader.empty() && leader != "0", {}};
+  if (const JsonTree *errors = find(response, "errors", Kind::kArray)) {
+    for (const JsonTree &error : errors->items) status.errors.push_back(escaped(error.text));
+  }
+  return status;
 }
 
 std::optional<Refusal> readRefusal(const std::string &json) {
-  const Json answer = parse(json);
-  if (!answer.is_object()) return std::nullopt;
-  const Json *code = find(answer, "code");
-  const Json *message = find(answer, "message");
-  if (message == nullptr) message = find(answer, "error");
-  if (code == nullptr || !code->is_number_integer()) return std::nullopt;
-  if (message == nullptr || !message->is_string()) return std::nullopt;
-  return Refusal{code->get<int64_t>(), message->get<std::string>()};
+  const JsonTree response = parseJson(json);
+  const JsonTree *code = response.find("code");
+  const JsonTree *message = response.find("message");
+  if (message == nullptr) message = response.find("error");
+  if (code == nullptr || code->kind != Kind::kNumber) return std::nullopt;
+  if (message == nullptr || message->kind != Kind::kText) return std::nullopt;
+  Refusal refusal{0, escaped(message->text)};
+  const char *end = code->text.data() + code->text.size();
+  const auto result = std::from_chars(code->text.data(), end, refusal.code);
+  if (result.ec != std::errc() || result.ptr != end) return std::nullopt;
+  return refusal;
 }
 
 }  // namespace Kestrel::Etcd

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // One row for each refusal that has a meaning of its own. gRPC's number comes first; where etcd
-// gives several refusals one number, its text tells them apart, for it sends nothing else.
+// uses one number for several refusals, only its text distinguishes them.
 #include "kestrel/etcd/refusal.h"
 
 #include <string_view>
@@ -24,7 +24,7 @@ constexpr int64_t kUnauthenticated = 16;
 
 struct Row {
   int64_t code;
-  std::string_view text;  // part of the message; empty: whatever it says
+  std::string_view text;  // part of the message; empty: any
   Meaning meaning;
 };
 
@@ -36,9 +36,12 @@ constexpr Row kRows[] = {
     {kDeadlineExceeded, "", Meaning::kMember},
     {kFailedPrecondition, "authentication is not enabled", Meaning::kNoUsers},
     {kOutOfRange, "has been compacted", Meaning::kCompacted},
-    {kOutOfRange, "is a future revision", Meaning::kBehind},
+    {kOutOfRange, "is a future revision", Meaning::kMoment},
     {kUnimplemented, "", Meaning::kMember},
     {kInternal, "", Meaning::kMember},
+    {kUnavailable, "leader changed", Meaning::kMoment},
+    {kUnavailable, "no leader", Meaning::kMoment},
+    {kUnavailable, "request timed out", Meaning::kMoment},
     {kUnavailable, "", Meaning::kMember},
     {kUnauthenticated, "", Meaning::kToken},
 };
@@ -64,7 +67,9 @@ Meaning meaningOf(const Refusal &refusal, bool change) {
   // A full store refuses changes; a member with too much to do refuses anything.
   if (refusal.code == kResourceExhausted) return change ? Meaning::kRefused : Meaning::kMember;
   for (const Row &row : kRows) {
-    if (row.code == refusal.code && contains(refusal.message, row.text)) return row.meaning;
+    if (row.code != refusal.code || !contains(refusal.message, row.text)) continue;
+    // A change that was begun may still be made: it is not sent again.
+    return change && row.meaning == Meaning::kMoment ? Meaning::kMember : row.meaning;
   }
   return Meaning::kRefused;
 }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What a refusal of etcd's means for the one who asked.
+// What a refusal by etcd means for the request.
 #pragma once
 
 #include "kestrel/etcd/protocol.h"
@@ -7,18 +7,18 @@
 namespace Kestrel::Etcd {
 
 enum class Meaning {
-  kMember,     // this member cannot answer; another one may
-  kToken,      // the token has expired, or there is none where one is wanted
-  kBehind,     // the member has not seen the asked revision yet
-  kCompacted,  // no member knows the asked revision any more
+  kMember,     // this member cannot respond; another one may
+  kMoment,     // this member, or the cluster, needs a moment; it may be asked again
+  kToken,      // the token has expired, or one is missing
+  kCompacted,  // no member has the requested revision any more
   kNoUsers,    // the server has no authentication
-  kRefused,    // the answer is no, and no member would say anything else
+  kRefused,    // every member would refuse the request
 };
 
 // change: the request would have changed the store.
 Meaning meaningOf(const Refusal &refusal, bool change);
 
-// The server's words, with the name of the option that sets the limit where it is one.
+// The server's text; where it names a limit, with the option that sets it.
 std::string describe(const Refusal &refusal);
 
 }  // namespace Kestrel::Etcd

@@ -3,12 +3,18 @@
 // up: a process that is killed in between leaves too much reserved, never too little.
 #include "knob/linux/allocations.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <algorithm>
+#include <cerrno>
 #include <tuple>
 
 #include "knob/admission.h"
 #include "knob/allocation.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
+#include "knob/names.h"
 #include "knob/peaks.h"
 
 namespace Knob::Linux {
@@ -16,9 +22,25 @@ namespace {
 
 constexpr Resource kResources[] = {Resource::kMemory, Resource::kCpu};
 
+std::string fixedChildPath() {
+  return std::string(kRootName) + "/" + std::string(kFixedChildName);
+}
+
 bool areEqual(const Allocation &left, const Allocation &right) {
   return std::tie(left.min, left.max, left.minLimit, left.shares) ==
          std::tie(right.min, right.max, right.minLimit, right.shares);
+}
+
+// Whether only root, or the user of this process, can have written the group's record.
+bool isOurs(const Group &group) {
+  struct stat status {};
+  if (::fstat(group.fd(), &status) != 0) fail(errno, "cannot examine the group's directory");
+  return status.st_uid == 0 || status.st_uid == ::geteuid();
+}
+
+int64_t minimumIn(const Group &group) {
+  const auto text = readControlIfAny(group.fd(), infoOf(Control::kMemoryMin).name);
+  return text ? minimumMegabytes(parseLimit(*text).value_or(0)) : 0;
 }
 
 void raisePeaks(Record &record) {
@@ -65,7 +87,7 @@ void AllocationManager::change(Group &group, Resource resource, const Allocation
 }
 
 void AllocationManager::remove(Group &group, Group &parent) {
-  const StoredRecord stored = readRecord(group.fd());
+  const StoredRecord stored = read(group);
   std::vector<Ancestor> ancestors;
   for (Resource resource : kResources) {
     ResourceState own;
@@ -104,9 +126,39 @@ std::vector<Deviation> AllocationManager::deviations(const Group &group, const R
   return found;
 }
 
+StoredRecord AllocationManager::read(Group &group) {
+  StoredRecord stored = readRecord(group.fd());
+  const GroupPtr parent = stored.isStored && !isOurs(group) ? tree_.parentOf(group) : GroupPtr();
+  if (!parent) return stored;
+  for (Resource resource : kResources) {
+    ResourceState &state = stored.record.state(resource);
+    const int64_t counted = countedFor(group, *parent, resource);
+    state.allocation.min = std::min(state.allocation.min, counted);
+    state.childrenSum = std::min(state.childrenSum, counted);
+  }
+  return stored;
+}
+
+// What is left of the parent's sum without the other children. Of another delegated one only the
+// file counts that libknob wrote.
+int64_t AllocationManager::countedFor(const Group &group, Group &parent, Resource resource) {
+  int64_t counted = read(parent).record.state(resource).childrenSum;
+  for (const Child &child : readChildren(parent.fd())) {
+    if (child.id == group.id) continue;
+    const GroupPtr sibling = tree_.find(child.id);
+    const StoredRecord stored = readRecord(sibling->fd());
+    if (isOurs(*sibling)) {
+      counted = changedSum(counted, reservationOf(countedState(stored, resource)), 0);
+    } else if (resource == Resource::kMemory) {
+      counted = changedSum(counted, minimumIn(*sibling), 0);
+    }
+  }
+  return counted;
+}
+
 // A record that cannot be read may be that of a newer library, so it is not overwritten.
 StoredRecord AllocationManager::readToChange(Group &group) {
-  StoredRecord stored = readRecord(group.fd());
+  StoredRecord stored = read(group);
   if (stored.isDamaged) {
     throw KernelError(Status::kFailure, "the record of " + tree_.nameOf(group) +
                                             " is damaged or of another version; see knobctl check");
@@ -152,6 +204,22 @@ void AllocationManager::apply(Group &group, const StoredRecord &stored, Resource
   }
   updateCpu(writes, group, stored, after);
   writes.commit();
+  protectMembers(group, stored.record, after);
+}
+
+int AllocationManager::oomScoreAdj(const Record &record) const {
+  return oomScoreAdjFor(record.memory.allocation.min, oomMachineBytes());
+}
+
+// Without the right to lower a value the minimum still protects from reclaim; check() reports it.
+void AllocationManager::protectMembers(const Group &group, const Record &before,
+                                       const Record &after) const {
+  const int64_t formerMin = before.memory.allocation.min, min = after.memory.allocation.min;
+  if (min == formerMin) return;
+  if ((min == 0) != (formerMin == 0)) markForOomd(group.fd(), min != 0);
+  for (const int64_t pid : readMembers(group.fd())) {
+    (void)changeOomScoreAdj(pid, oomScoreAdj(before), oomScoreAdj(after));
+  }
 }
 
 // Only a reservation of host itself competes with groups of other programs.
@@ -196,16 +264,63 @@ void AllocationManager::admitInto(std::vector<Ancestor> &ancestors, Group &group
     above = tree_.parentOf(*above);
   }
 
-  const auto admitted = admit(std::move(states), wanted, capacity(resource));
-  if (!admitted) {
-    throw KernelError(Status::kReservationRefused,
-                      "no room in the group, in one above it or on the machine");
-  }
+  const bool grows = reservationOf({wanted, own.childrenSum}) > reservationOf(own);
+  const int64_t capacity = grows ? account(resource).capacity() : 0;
+  Refusal refusal{};
+  const auto admitted = admit(std::move(states), wanted, capacity, &refusal);
+  if (!admitted) refuse(refusal, resource, group, ancestors);
   for (size_t i = 1; i < admitted->size(); ++i) {
     Record &record = ancestors[i - 1].after;
     record.state(resource) = (*admitted)[i];
     raisePeaks(record);
   }
+}
+
+// Of the groups directly below the ones at the paths, the few that reserve most.
+std::vector<Holder> AllocationManager::largestReservations(Resource resource,
+                                                           const std::vector<std::string> &paths) {
+  constexpr size_t kMaxNamed = 3;
+  std::vector<Holder> holders;
+  for (const std::string &path : paths) {
+    const GroupPtr group = tree_.lookUp(path);
+    if (!group) continue;
+    for (const Child &child : readChildren(group->fd())) {
+      const std::string childPath = path + "/" + child.name;
+      const GroupPtr below = childPath == fixedChildPath() ? GroupPtr() : tree_.lookUp(childPath);
+      const int64_t reserved =
+          below ? reservationOf(readRecord(below->fd()).record.state(resource)) : 0;
+      if (reserved > 0) holders.push_back({childPath, reserved});
+    }
+  }
+  std::stable_sort(holders.begin(), holders.end(), [](const Holder &left, const Holder &right) {
+    return left.amount > right.amount;
+  });
+  if (holders.size() > kMaxNamed) holders.resize(kMaxNamed);
+  return holders;
+}
+
+// "250 MB asked for, 116 MB free on the machine: 64 MB for the system, 300 MB for host/opt/a".
+void AllocationManager::refuse(const Refusal &refusal, Resource resource, Group &group,
+                               const std::vector<Ancestor> &ancestors) {
+  const auto amount = [&](int64_t number) {
+    return std::to_string(number) + " " + unitOf(resource);
+  };
+  std::string text = amount(refusal.asked) + " asked for, " +
+                     amount(std::max<int64_t>(refusal.free, 0)) + " free ";
+  std::vector<Holder> holders;
+  std::vector<std::string> paths = {std::string(kRootName), fixedChildPath()};
+  if (refusal.at > ancestors.size()) {
+    text += "on the machine";
+    holders = account(resource).holders;
+  } else {
+    paths = {tree_.pathOf(refusal.at == 0 ? group : *ancestors[refusal.at - 1].group)};
+    text += "in " + paths.front();
+  }
+  for (Holder &each : largestReservations(resource, paths)) holders.push_back(std::move(each));
+  for (size_t i = 0; i < holders.size(); ++i) {
+    text += (i == 0 ? ": " : ", ") + amount(holders[i].amount) + " for " + holders[i].name;
+  }
+  throw KernelError(Status::kReservationRefused, text);
 }
 
 // Another program may have written the files of a group without a record.

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "knob/linux/capacity.h"
 #include "knob/linux/cgroup_tree.h"
 #include "knob/linux/control_values.h"
 #include "knob/linux/cpu_distribution.h"
@@ -26,8 +27,17 @@ std::string textOf(const Deviation &deviation);
 
 class AllocationManager {
  public:
-  AllocationManager(CgroupTree &tree, const HostFacts &facts)
-      : tree_(tree), facts_(facts), cpu_(tree, facts) {}
+  // The references must outlive this object.
+  AllocationManager(CgroupTree &tree, const HostFacts &facts, const Reserve &reserve)
+      : tree_(tree),
+        facts_(facts),
+        capacity_(tree.hierarchy(), facts, reserve),
+        cpu_(tree, facts) {}
+
+  // The record of a group. A directory that belongs to another user is delegated, and its owner can
+  // write the record: then no more is reserved than the group above counts for it. Throws
+  // KernelError.
+  StoredRecord read(Group &group);
 
   // Gives a new group its record. Throws KernelError; the caller then removes the group.
   void add(const GroupPtr &group, Group &parent);
@@ -46,7 +56,11 @@ class AllocationManager {
 
   const CpuDistribution &cpu() const { return cpu_; }
 
-  int64_t capacity(Resource resource) const { return machineCapacity(facts_, resource); }
+  // The oom_score_adj that the members of a group get.
+  int oomScoreAdj(const Record &record) const;
+
+  // What the machine can promise.
+  const Account &account(Resource resource) { return capacity_.account(resource); }
 
  private:
   // A group above the one that changes.
@@ -60,7 +74,12 @@ class AllocationManager {
   // counts. Returns whether it did; the caller must then read the record again.
   bool countForeignMinimum(Group &group, const StoredRecord &stored);
   StoredRecord readToChange(Group &group);
+  int64_t countedFor(const Group &group, Group &parent, Resource resource);
   void apply(Group &group, const StoredRecord &stored, Resource resource, const Allocation &wanted);
+  void protectMembers(const Group &group, const Record &before, const Record &after) const;
+  [[noreturn]] void refuse(const Refusal &refusal, Resource resource, Group &group,
+                           const std::vector<Ancestor> &ancestors);
+  std::vector<Holder> largestReservations(Resource resource, const std::vector<std::string> &paths);
   void admitInto(std::vector<Ancestor> &ancestors, Group &group, Resource resource,
                  const ResourceState &own, const Allocation &wanted);
   ControlTexts currentTexts(const Group &group, const StoredRecord &stored,
@@ -74,6 +93,7 @@ class AllocationManager {
 
   CgroupTree &tree_;
   const HostFacts &facts_;
+  Capacity capacity_;
   CpuDistribution cpu_;
 };
 

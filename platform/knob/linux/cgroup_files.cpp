@@ -3,6 +3,7 @@
 // deleted for its holder, even when another group of its name was made.
 #include "knob/linux/cgroup_files.h"
 
+#include <dirent.h>
 #include <fcntl.h>
 #include <sys/xattr.h>
 #include <unistd.h>
@@ -10,6 +11,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <charconv>
+#include <memory>
 #include <system_error>
 
 #include "common/unique_fd.h"
@@ -22,6 +24,10 @@ using Platform::UniqueFd;
 constexpr size_t kReadStep = 4096;
 // More than any of our attributes. A longer one is damaged.
 constexpr size_t kMaxAttributeBytes = 256;
+
+struct DirectoryCloser {
+  void operator()(DIR *directory) const { (void)::closedir(directory); }
+};
 
 // Reads to the end. Returns 0 or the errno.
 int readWhole(int file, std::string &text) {
@@ -126,6 +132,23 @@ std::optional<std::string> readControlIfAny(int directory, const char *name) {
 
 bool hasControl(int directory, const char *name) {
   return ::faccessat(directory, name, F_OK, 0) == 0;
+}
+
+std::vector<Child> readChildren(int group) {
+  UniqueFd directory(::openat(group, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  if (!directory) fail(errno, "cannot read the group's directory");
+  const std::unique_ptr<DIR, DirectoryCloser> stream(::fdopendir(directory.get()));
+  if (!stream) fail(errno, "cannot read the group's directory");
+  (void)directory.release();  // the stream closes it
+
+  std::vector<Child> children;
+  for (errno = 0; const dirent *entry = ::readdir(stream.get()); errno = 0) {
+    const std::string_view name = entry->d_name;
+    if (entry->d_type != DT_DIR || name == "." || name == "..") continue;
+    children.push_back({static_cast<GroupId>(entry->d_ino), std::string(name)});
+  }
+  if (errno != 0) fail(errno, "cannot read the group's directory");
+  return children;
 }
 
 std::vector<int64_t> readMembers(int directory) {

@@ -63,6 +63,14 @@ std::optional<std::string> readControlIfAny(int directory, const char *name);
 
 bool hasControl(int directory, const char *name);
 
+struct Child {
+  GroupId id;
+  std::string name;
+};
+
+// The child groups. One that is deleted meanwhile hides no other. Throws KernelError.
+std::vector<Child> readChildren(int directory);
+
 // The living processes of the group itself, without those of another pid namespace. Throws
 // KernelError.
 std::vector<int64_t> readMembers(int directory);

@@ -3,7 +3,6 @@
 // was checked when it was first looked up still holds.
 #include "knob/linux/cgroup_tree.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -31,31 +30,32 @@ constexpr mode_t kDirectoryMode = 0755;
 constexpr nlink_t kLinksOfALeaf = 2;
 constexpr size_t kMaxOpenGroups = 48;
 constexpr size_t kMaxKnownPaths = 64;
-constexpr size_t kMaxStatBytes = 4096;
+constexpr size_t kMaxProcBytes = 16384;
 static_assert(sizeof(ino_t) == sizeof(GroupId), "an inode number is a group's id");
 
 // In one write: in a group with processes "+cpu" alone would succeed and make it a threaded one.
 constexpr const char *kEnable = "+memory +cpu";
 constexpr const char *kDisable = "-memory -cpu";
 
-struct DirectoryCloser {
-  void operator()(DIR *directory) const { (void)::closedir(directory); }
-};
-
 bool hasControllers(const Group &group) {
   return hasControl(group.fd(), infoOf(Control::kMemoryMax).name) &&
          hasControl(group.fd(), infoOf(Control::kCpuMax).name);
 }
 
-bool isAlive(const std::string &pid) {
+// Empty when the process has ended.
+std::string procText(int64_t pid, const char *file) {
   try {
-    const std::string stat = Platform::readFile("/proc/" + pid + "/stat", kMaxStatBytes);
-    // "PID (NAME) STATE ...": the name may contain parentheses too.
-    const size_t state = stat.rfind(") ") + 2;
-    return state < stat.size() && stat[state] != 'Z' && stat[state] != 'X';
+    return Platform::readFile("/proc/" + std::to_string(pid) + "/" + file, kMaxProcBytes);
   } catch (const std::system_error &) {
-    return false;
+    return {};
   }
+}
+
+bool isAlive(int64_t pid) {
+  const std::string stat = procText(pid, "stat");
+  // "PID (NAME) STATE ...": the name may contain parentheses too.
+  const size_t state = stat.rfind(") ") + 2;
+  return state < stat.size() && stat[state] != 'Z' && stat[state] != 'X';
 }
 
 std::string_view lastComponent(std::string_view path) {
@@ -66,23 +66,6 @@ std::string_view lastComponent(std::string_view path) {
 int openGroup(int directory, std::string_view name, UniqueFd &opened, Identity &identity) {
   const int error = openBeneath(directory, name, opened);
   return error != 0 ? error : identify(opened.get(), "", identity);
-}
-
-std::vector<Child> listGroups(int group) {
-  UniqueFd directory(::openat(group, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (!directory) fail(errno, "cannot read the group's directory");
-  const std::unique_ptr<DIR, DirectoryCloser> stream(::fdopendir(directory.get()));
-  if (!stream) fail(errno, "cannot read the group's directory");
-  (void)directory.release();  // the stream closes it
-
-  std::vector<Child> children;
-  for (errno = 0; const dirent *entry = ::readdir(stream.get()); errno = 0) {
-    const std::string_view name = entry->d_name;
-    if (entry->d_type != DT_DIR || name == "." || name == "..") continue;
-    children.push_back({static_cast<GroupId>(entry->d_ino), std::string(name)});
-  }
-  if (errno != 0) fail(errno, "cannot read the group's directory");
-  return children;
 }
 
 }  // namespace
@@ -210,7 +193,7 @@ GroupPtr CgroupTree::findByWalking(GroupId id) {
     paths.pop_back();
     Group group;
     if (openBeneath(hierarchy_.directory.get(), path, group.directory) != 0) continue;
-    for (const Child &child : children(group)) {
+    for (const Child &child : readChildren(group.fd())) {
       paths.push_back(path + "/" + child.name);
       if (child.id != id) continue;
       if (GroupPtr found = lookUp(paths.back()); found && found->id == id) return found;
@@ -322,17 +305,22 @@ const std::string &CgroupTree::nameOf(Group &group) {
   return group.name;
 }
 
-std::vector<Child> CgroupTree::children(const Group &group) const {
-  return listGroups(group.fd());
+std::string CgroupTree::pathOf(Group &group) {
+  std::string path = nameOf(group);
+  for (GroupPtr above = parentOf(group); above; above = parentOf(*above)) {
+    path = nameOf(*above) + "/" + path;
+  }
+  return path;
 }
 
 std::vector<Child> CgroupTree::besideHost() const {
-  std::vector<Child> groups = listGroups(hierarchy_.directory.get());
+  std::vector<Child> groups = readChildren(hierarchy_.directory.get());
   groups.erase(std::remove_if(groups.begin(), groups.end(),
                               [](const Child &group) { return group.name == kRootName; }),
                groups.end());
   return groups;
 }
+
 bool CgroupTree::hasChildren(const Group &group) const {
   struct stat status {};
   if (::fstat(group.fd(), &status) != 0) fail(errno, "cannot examine the group's directory");
@@ -362,7 +350,22 @@ void CgroupTree::addMember(Group &group, int64_t pid) {
   }
   if (error != 0) fail(error, "cannot move process " + text);
   // Linux accepts a zombie and leaves it where it is.
-  if (!isAlive(text)) throw KernelError(Status::kNotFound, "no such process");
+  if (!isAlive(pid)) throw KernelError(Status::kNotFound, "no such process");
+}
+
+// The path in /proc begins at the root of the cgroup namespace, which need not be the mount's. So
+// the part from host on is looked up, and the members of that group decide.
+GroupPtr CgroupTree::groupOf(int64_t pid) {
+  const std::string text = procText(pid, "cgroup");
+  const size_t line = text.rfind("0::/");
+  const size_t slash =
+      line == std::string::npos ? line : text.find("/" + std::string(kRootName), line);
+  if (slash == std::string::npos) return {};
+  const std::string path = text.substr(slash + 1, text.find('\n', slash) - slash - 1);
+  GroupPtr group = splitPath(path) ? lookUp(path) : GroupPtr();
+  if (!group) return {};
+  const std::vector<int64_t> pids = readMembers(group->fd());
+  return std::find(pids.begin(), pids.end(), pid) == pids.end() ? GroupPtr() : group;
 }
 
 void CgroupTree::write(Group &group, Control control, std::string_view text) {

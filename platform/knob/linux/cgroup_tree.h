@@ -32,11 +32,6 @@ struct Group {
 };
 using GroupPtr = std::shared_ptr<Group>;
 
-struct Child {
-  GroupId id;
-  std::string name;
-};
-
 class CgroupTree {
  public:
   explicit CgroupTree(Hierarchy hierarchy);
@@ -68,11 +63,10 @@ class CgroupTree {
   // Throws KernelError (busy, not found).
   void remove(Group &group, Group &parent);
 
-  // The group's name in its parent's directory.
+  // The group's name in its parent's directory, and its path from host on.
   const std::string &nameOf(Group &group);
+  std::string pathOf(Group &group);
 
-  // The child groups. One that is deleted meanwhile hides no other.
-  std::vector<Child> children(const Group &group) const;
   bool hasChildren(const Group &group) const;
 
   // The groups of other programs beside host. Throws KernelError.
@@ -82,6 +76,9 @@ class CgroupTree {
 
   // Whether living processes are in the group or below it.
   bool isPopulated(const Group &group) const;
+
+  // The group that a process is in; empty when it is not in the tree, or has ended.
+  GroupPtr groupOf(int64_t pid);
 
   // Moves a process into a group without child groups. Throws KernelError: not found (no such
   // living process), bad parameter (a kernel thread).

@@ -9,6 +9,7 @@
 
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
 #include "knob/signature.h"
@@ -23,6 +24,7 @@ struct Entry {
   GroupId id;
   std::string path;
   size_t parent;  // index in the list; that of the first is its own
+  bool hasChildren = false;
   int64_t memorySum = 0, cpuSum = 0;
   CpuChildren cpuChildren;  // as counted, with the division that follows
   bool isCounted = false;   // it is there, and has a record
@@ -69,7 +71,8 @@ class Checker {
     entries_.emplace_back(tree_.host()->id, std::string(kRootName), 0);
     for (size_t i = 0; i < entries_.size(); ++i) {
       whileThere([&] {
-        for (const Child &child : tree_.children(*tree_.find(entries_[i].id))) {
+        for (const Child &child : readChildren(tree_.find(entries_[i].id)->fd())) {
+          entries_[i].hasChildren = true;
           entries_.emplace_back(child.id, entries_[i].path + "/" + child.name, i);
         }
       });
@@ -80,7 +83,7 @@ class Checker {
     whileThere([&] {
       const GroupPtr group = tree_.find(entry.id);
       tree_.requireAlive(*group);
-      StoredRecord stored = readRecord(group->fd());
+      StoredRecord stored = allocations_.read(*group);
       if (stored.isDamaged) repairRecord(entry, *group, stored);
       if (stored.isStored) checkRecord(entry, *group, stored.record);
       if (!stored.isStored && (entry.memorySum != 0 || entry.cpuSum != 0)) {
@@ -196,6 +199,8 @@ class Checker {
         if (repair_) trouble = repairFile(*group, entry.record, deviation);
         report(entry.path, textOf(deviation) + trouble, repair_ && trouble.empty());
       }
+      checkMembers(entry, *group);
+      checkProtection(entry);
     });
   }
 
@@ -218,20 +223,48 @@ class Checker {
     }
   }
 
+  void checkProtection(const Entry &entry) {
+    const int64_t surplus = entry.record.memory.allocation.min - entry.memorySum;
+    if (tree_.hierarchy().protectsRecursively || !entry.hasChildren || surplus <= 0) return;
+    report(entry.path,
+           std::to_string(surplus) +
+               " MB of its memory minimum protect nothing, since its child groups do not reserve "
+               "them: cgroup2 is mounted without memory_recursiveprot",
+           false);
+  }
+
+  // Processes that another program moved in.
+  void checkMembers(const Entry &entry, const Group &group) {
+    const int wanted = allocations_.oomScoreAdj(entry.record);
+    if (wanted == 0) return;
+    const std::vector<int64_t> without = withoutOomScoreAdj(readMembers(group.fd()), wanted);
+    if (without.empty()) return;
+    bool repaired = repair_;
+    for (const int64_t pid : without) {
+      repaired = repaired && changeOomScoreAdj(pid, 0, wanted);
+    }
+    report(entry.path,
+           std::to_string(without.size()) + " of its processes lack the oom_score_adj of " +
+               std::to_string(wanted) + " that its minimum asks for",
+           repaired);
+  }
+
   void checkMachine(int64_t memory, int64_t cpu) {
-    checkCapacity(Resource::kMemory, memory, " MB");
-    checkCapacity(Resource::kCpu, cpu, " percent of CPU");
+    checkCapacity(Resource::kMemory, memory);
+    checkCapacity(Resource::kCpu, cpu);
     for (std::string &text : unprotectedAbove(tree_.hierarchy(), memory)) {
       report(std::string(kRootName), text, false);
     }
   }
 
-  void checkCapacity(Resource resource, int64_t reserved, const std::string &unit) {
-    const int64_t capacity = allocations_.capacity(resource);
-    if (reserved <= capacity) return;
+  void checkCapacity(Resource resource, int64_t reserved) {
+    const Account &account = allocations_.account(resource);
+    if (reserved <= account.capacity()) return;
     report(std::string(kRootName),
-           "the groups reserve " + std::to_string(reserved) + unit + ", the machine has " +
-               std::to_string(capacity),
+           "more is promised than the machine can give: the groups reserve " +
+               std::to_string(reserved) + " " + unitOf(resource) + ", it has " +
+               std::to_string(account.capacity()) + " for them of " +
+               std::to_string(account.total) + " (" + textOf(account) + ")",
            false);
   }
 

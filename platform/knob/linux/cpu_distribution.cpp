@@ -71,7 +71,7 @@ class Update {
   // Without those that another program deletes meanwhile.
   template <typename F>
   void forEachChild(const Group &group, const F &f) const {
-    for (const Child &child : tree_.children(group)) {
+    for (const Child &child : readChildren(group.fd())) {
       try {
         f(*tree_.find(child.id));
       } catch (const KernelError &error) {

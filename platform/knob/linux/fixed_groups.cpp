@@ -42,7 +42,7 @@ GroupPtr makeIfMissing(CgroupTree &tree, Group *parent, const std::string &path)
 
 // Whether there are no groups but the two.
 bool isUntouched(CgroupTree &tree, const Group &host) {
-  for (const Child &child : tree.children(host)) {
+  for (const Child &child : readChildren(host.fd())) {
     if (child.name != kFixedChildName) return false;
     const GroupPtr opt = tree.lookUp(optPath());
     if (opt && tree.hasChildren(*opt)) return false;

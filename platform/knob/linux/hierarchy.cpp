@@ -88,9 +88,9 @@ void addLine(CgroupMounts &mounts, std::string_view line) {
   }
   const std::optional<int> id = number(fields[kIdField]);
   if (type != "cgroup2" || !id) return;
-  mounts.unified.push_back(
-      {*id, unescaped(fields[kRootField]), unescaped(fields[kPointField]),
-       hasOption(fields[kOptionsField], "ro") || hasOption(superOptions, "ro")});
+  mounts.unified.push_back({*id, unescaped(fields[kRootField]), unescaped(fields[kPointField]),
+                            hasOption(fields[kOptionsField], "ro") || hasOption(superOptions, "ro"),
+                            hasOption(superOptions, "memory_recursiveprot")});
 }
 
 [[noreturn]] void notUsable(const std::string &reason) {
@@ -215,7 +215,8 @@ std::string missingControllers(const std::string &controllers, const CgroupMount
 Hierarchy openHierarchy(const Configuration &configuration) {
   const CgroupMounts mounts = readMounts();
   OpenMount found = openBestMount(mounts);
-  Hierarchy hierarchy{std::move(found.directory), found.mount.point};
+  Hierarchy hierarchy{std::move(found.directory), found.mount.point,
+                      found.mount.protectsRecursively};
 
   const std::string folder = withoutSlashes(configuration.cgroupRoot);
   if (!folder.empty()) {

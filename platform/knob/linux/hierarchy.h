@@ -17,6 +17,7 @@ struct CgroupMount {
   std::string root;   // the group that the mount shows as its root; "/" is the whole hierarchy
   std::string point;  // where it is mounted
   bool readOnly = false;
+  bool protectsRecursively = false;  // memory_recursiveprot
 };
 
 struct CgroupMounts {
@@ -30,6 +31,9 @@ CgroupMounts parseMountInfo(std::string_view text);
 struct Hierarchy {
   Platform::UniqueFd directory;  // the folder that contains, or will contain, host
   std::string path;              // of that folder, for people
+  // Whether what a group reserves protects its child groups too, beyond what they reserve
+  // themselves: the mount option memory_recursiveprot.
+  bool protectsRecursively = false;
 };
 
 // Throws KernelError: kernel not usable, with the reason and what to do.

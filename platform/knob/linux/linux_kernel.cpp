@@ -15,6 +15,7 @@
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/hierarchy.h"
 #include "knob/linux/lowering.h"
+#include "knob/linux/oom_score.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/machine_facts.h"
 #include "knob/names.h"
@@ -46,8 +47,10 @@ GroupUsage usageOf(const Group &group) {
 
 class LinuxKernel final : public Kernel {
  public:
-  LinuxKernel(Hierarchy hierarchy, uint32_t maxVms)
-      : tree_(std::move(hierarchy)), facts_(factsWith(maxVms)), allocations_(tree_, facts_) {}
+  LinuxKernel(Hierarchy hierarchy, const Configuration &configuration)
+      : tree_(std::move(hierarchy)),
+        facts_(factsWith(configuration.maxVms)),
+        allocations_(tree_, facts_, configuration.reserve) {}
 
   GroupId lookUp(std::string_view path) override {
     const auto components = splitPath(path);
@@ -99,7 +102,7 @@ class LinuxKernel final : public Kernel {
 
   std::vector<GroupId> childGroups(GroupId id) override {
     std::vector<GroupId> ids;
-    for (const Child &child : tree_.children(*find(id))) ids.push_back(child.id);
+    for (const Child &child : readChildren(find(id)->fd())) ids.push_back(child.id);
     return ids;
   }
 
@@ -111,7 +114,9 @@ class LinuxKernel final : public Kernel {
     if (tree_.hasChildren(*group)) throw KernelError(Status::kBusy, "the group has child groups");
     // Linux would move the process, and kill it as soon as it needs a page.
     requireAnyMemory(group);
+    const int former = oomScoreAdjFromUs(pid);
     tree_.addMember(*group, pid);
+    (void)changeOomScoreAdj(pid, former, allocations_.oomScoreAdj(readRecord(group->fd()).record));
   }
 
   MemoryStatistics memoryStatistics(GroupId id) override {
@@ -163,6 +168,13 @@ class LinuxKernel final : public Kernel {
                           "the memory maximum of " + tree_.nameOf(*group) + " is 0");
       }
     }
+  }
+
+  // The oom_score_adj that a process got when it joined the group that it is in now.
+  int oomScoreAdjFromUs(int64_t pid) {
+    if (readOomScoreAdj(pid).value_or(0) == 0) return 0;
+    const GroupPtr group = tree_.groupOf(pid);
+    return group ? allocations_.oomScoreAdj(readRecord(group->fd()).record) : 0;
   }
 
   // For a caller that reports an earlier error.
@@ -220,6 +232,14 @@ bool mayMakeGroupsIn(int directory) {
   return true;
 }
 
+std::string accountLine(const Account &account, int64_t reserved) {
+  const auto amount = [&](int64_t number) {
+    return std::to_string(number) + " " + unitOf(account.resource);
+  };
+  return amount(account.total) + ": " + textOf(account) + "; " + amount(account.capacity()) +
+         " for groups, which reserve " + amount(reserved);
+}
+
 LinuxHost lookAt(const Configuration &configuration) {
   CgroupTree tree(openHierarchy(configuration));
   LinuxHost result;
@@ -231,8 +251,20 @@ LinuxHost lookAt(const Configuration &configuration) {
     result.problems.push_back("no right to make or change groups in " + result.path +
                               kHowToGetRights);
   }
+  const Record record = host ? readRecord(host->fd()).record : Record();
+  const int64_t promisedMB = reservationOf(record.memory);
+  const HostFacts facts = factsWith(configuration.maxVms);
+  for (const auto &[name, resource] :
+       {std::pair("memory", Resource::kMemory), std::pair("CPU", Resource::kCpu)}) {
+    const Account account = readAccount(resource, tree.hierarchy(), facts, configuration.reserve);
+    result.account.emplace_back(name, accountLine(account, reservationOf(record.state(resource))));
+  }
+  if (!tree.hierarchy().protectsRecursively) {
+    result.account.emplace_back("protection",
+                                "a minimum protects no child groups beyond what they reserve: "
+                                "cgroup2 is mounted without memory_recursiveprot");
+  }
   if (!host) return result;
-  const int64_t promisedMB = reservationOf(readRecord(host->fd()).record.memory);
   for (std::string &text : unprotectedAbove(tree.hierarchy(), promisedMB)) {
     result.problems.push_back(std::move(text));
   }
@@ -244,8 +276,7 @@ LinuxHost lookAt(const Configuration &configuration) {
 
 std::unique_ptr<Kernel> openLinuxKernel(const Configuration &configuration) {
   return Linux::beforeUse([&] {
-    return std::make_unique<Linux::LinuxKernel>(Linux::openHierarchy(configuration),
-                                                configuration.maxVms);
+    return std::make_unique<Linux::LinuxKernel>(Linux::openHierarchy(configuration), configuration);
   });
 }
 

@@ -5,6 +5,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "knob/configuration.h"
@@ -20,6 +21,9 @@ struct LinuxHost {
   std::string path;                   // of the folder that contains, or will contain, host
   bool hasGroups = false;             // whether host exists
   std::vector<std::string> problems;  // each with what to do
+  // Lines for the status. Of memory and of the CPUs: "memory", "480 MB: 64 MB for the system; 416
+  // MB for groups, which reserve 300 MB".
+  std::vector<std::pair<std::string, std::string>> account;
 };
 
 // Only looks. Throws KernelError: kernel not usable, with the reason.

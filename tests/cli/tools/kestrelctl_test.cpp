@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// kestrelctl as its users run it: what each command prints, answers and changes, byte for byte.
+// kestrelctl as its users run it: what each command prints, returns and changes, byte for byte.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -129,7 +129,7 @@ TEST_F(Kestrelctl, TheTypeCanBeGiven) {
 
 TEST_F(Kestrelctl, AValueThatIsNotOfItsTypeIsAUsageErrorAndMakesNoStore) {
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "7.5", "--type", "integer"}),
-            "kestrelctl: \"7.5\" is no integer\n");
+            "kestrelctl: \"7.5\" is not an integer\n");
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "9223372036854775808"}),
             "kestrelctl: \"9223372036854775808\" does not fit into 64 bits\n");
   EXPECT_EQ(err(2, {"set", "a", "b", "c", "x", "1", "--type", "date"}),
@@ -297,11 +297,11 @@ TEST_F(Kestrelctl, StatusTellsWhichStoreAndThatItCanBeUsed) {
   const std::string text = withoutFolder(out({"status"}), world_);
   EXPECT_THAT(text, StartsWith("configuration  FOLDER/kestrel.conf\n"
                                "store          sqlite\n"
-                               "place          FOLDER/store.db\n"
+                               "location       FOLDER/store.db\n"
                                "schema         version 1\n"
                                "objects        1\n"
                                "fields         1\n"
-                               "answers in     "));
+                               "responds in    "));
   EXPECT_THAT(text, HasSubstr(" ms\nstate          usable\n"));
 }
 
@@ -314,6 +314,17 @@ TEST_F(Kestrelctl, StatusTellsWhyAStoreCannotBeUsed) {
   EXPECT_EQ(result.status, 1);
   EXPECT_THAT(result.out, HasSubstr("store.db"));
   EXPECT_THAT(result.err, HasSubstr("the file is damaged"));
+}
+
+TEST_F(Kestrelctl, AnSqliteStoreHasNoLayers) {
+  set("x", "1");
+  EXPECT_EQ(err(2, {"get", "host", "pools", "backup", "--layer", "/kestrel"}),
+            "kestrelctl: --layer: an SQLite store has no layers\n");
+  EXPECT_EQ(err(1, {"move", "host", "pools", "backup", "--from", "/a", "--to", "/b"}),
+            "kestrelctl: FOLDER/store.db: an SQLite store has no layers\n");
+  EXPECT_EQ(withoutFolder(out({"get", "host", "pools", "backup", "--origin"}), world_),
+            "x\tinteger\t1\tFOLDER/store.db\n");
+  EXPECT_EQ(out({"check"}), "");
 }
 
 TEST_F(Kestrelctl, ABadConfigurationIsNamedWithItsLineByEveryCommand) {

@@ -1,12 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
-// kestrel.conf: its defaults, its keys, and that nothing wrong in it is passed over.
+// kestrel.conf: its defaults, its keys, and that nothing wrong in it is ignored.
 #include "kestrel/configuration.h"
 
 #include <gmock/gmock.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <array>
 
 #include "store_test.h"
 
@@ -36,8 +38,12 @@ TEST_F(ConfigurationFile, EmptyMeansTheDefaults) {
   const Configuration read = this->read("# nothing\n\n");
   EXPECT_TRUE(read.fileExists);
   EXPECT_EQ(read.engine, Engine::kSqlite);
-  EXPECT_EQ(read.prefix, "/kestrel");
+  EXPECT_THAT(read.prefixes, ElementsAre("/kestrel"));
   EXPECT_EQ(read.timeout.count(), 1000);
+  EXPECT_EQ(read.runTimeout.count(), 3000);
+  EXPECT_EQ(read.maxAge, std::chrono::hours(7 * 24));
+  EXPECT_EQ(read.snapshot, "");
+  EXPECT_EQ(read.lastRun, "");
   EXPECT_TRUE(read.endpoints.empty());
 }
 
@@ -45,21 +51,75 @@ TEST_F(ConfigurationFile, EveryKeyIsRead) {
   const Configuration read = this->read(
       "store = etcd\n"
       "path = /x/store.db\n"
-      "endpoints = https://a:2379 ,http://b,\thttps://[::1]:1\n"
-      "prefix = /fleet/one\n"
+      "endpoints = https://a:2379 ,https://b,\thttps://[::1]:1\n"
+      "prefix = /fleet/%L, /fleet/one\nlabel = rack.7\n"
       "cacert = /ca\ncert = /cert\nkey = /key\n"
       "user = reader\npassword-file = /secret\n"
-      "timeout-ms = 250\n");
+      "timeout-ms = 250\nrun-timeout-ms = 400\nmax-age = 36h\n"
+      "snapshot = /x/snapshot\nlast-run = /x/last\n");
   EXPECT_EQ(read.engine, Engine::kEtcd);
   EXPECT_EQ(read.path, "/x/store.db");
-  EXPECT_THAT(read.endpoints, ElementsAre("https://a:2379", "http://b", "https://[::1]:1"));
-  EXPECT_EQ(read.prefix, "/fleet/one");
+  EXPECT_THAT(read.endpoints, ElementsAre("https://a:2379", "https://b", "https://[::1]:1"));
+  EXPECT_THAT(read.prefixes, ElementsAre("/fleet/rack.7", "/fleet/one"));
   EXPECT_EQ(read.cacert, "/ca");
   EXPECT_EQ(read.cert, "/cert");
   EXPECT_EQ(read.key, "/key");
   EXPECT_EQ(read.user, "reader");
   EXPECT_EQ(read.passwordFile, "/secret");
   EXPECT_EQ(read.timeout.count(), 250);
+  EXPECT_EQ(read.runTimeout.count(), 400);
+  EXPECT_EQ(read.maxAge, std::chrono::hours(36));
+  EXPECT_EQ(read.snapshot, "/x/snapshot");
+  EXPECT_EQ(read.lastRun, "/x/last");
+}
+
+TEST_F(ConfigurationFile, ItsRunTimeoutIsThreeTimeoutsUnlessGiven) {
+  EXPECT_EQ(read("timeout-ms = 500\n").runTimeout.count(), 1500);
+}
+
+TEST_F(ConfigurationFile, ItsPrefixesNameHostAndLabel) {
+  std::array<char, 256> host{};
+  ASSERT_EQ(gethostname(host.data(), host.size() - 1), 0);
+  EXPECT_THAT(read("prefix = /k/host/%H, /k/%L/x, /k%%\nlabel = canary\n").prefixes,
+              ElementsAre("/k/host/" + std::string(host.data()), "/k/canary/x", "/k%"));
+  configure("prefix = /k/host/%H, /k/%L\nlabel = canary\n");
+  const HostNames other{"h2", "stable"};
+  EXPECT_THAT(readConfiguration(&other).prefixes, ElementsAre("/k/host/h2", "/k/stable"));
+  const HostNames unlabelled{"h2", ""};
+  EXPECT_THAT(failureOf([&] { readConfiguration(&unlabelled); }), HasSubstr("%L needs \"label\""));
+}
+
+TEST_F(ConfigurationFile, APrefixThatCannotBeExpandedIsRefused) {
+  EXPECT_THAT(refusal("prefix = /k/%L\n"), StartsWith(":1: prefix: %L needs \"label\""));
+  EXPECT_THAT(refusal("prefix = /k/%x\n"), StartsWith(":1: prefix: bad value"));
+  EXPECT_THAT(refusal("prefix = /k/%\n"), StartsWith(":1: prefix: bad value"));
+  EXPECT_THAT(refusal("prefix = /k, /k\n"), StartsWith(":1: prefix: \"/k\" is given twice"));
+  EXPECT_THAT(refusal("prefix = /k,\n"), StartsWith(":1: prefix: bad value"));
+  EXPECT_THAT(refusal("label = a/b\n"), StartsWith(":1: label: bad value"));
+  EXPECT_THAT(refusal("label = ..\n"), StartsWith(":1: label: bad value"));
+}
+
+TEST_F(ConfigurationFile, AnAgeHasAUnit) {
+  EXPECT_EQ(read("max-age = 90s\n").maxAge, std::chrono::seconds(90));
+  EXPECT_EQ(read("max-age = 30m\n").maxAge, std::chrono::minutes(30));
+  EXPECT_EQ(read("max-age = 0d\n").maxAge, std::chrono::seconds(0));
+  for (const char *age : {"7", "d", "-1d", "1w", "7 d", "99999d", "1.5h"}) {
+    EXPECT_THAT(refusal(std::string("max-age = ") + age + "\n"),
+                StartsWith(":1: max-age: bad value"));
+  }
+}
+
+TEST_F(ConfigurationFile, APasswordIsNotSentInClear) {
+  const std::string user = "user = u\npassword-file = /p\n";
+  EXPECT_THAT(refusal(user + "endpoints = https://a, http://b\n"),
+              StartsWith(":1: user: a password is sent only to https:// endpoints"));
+  EXPECT_NO_THROW(read(user + "endpoints = https://a\n"));
+}
+
+TEST_F(ConfigurationFile, ThatEveryUserMayWriteIsRefused) {
+  configure("path = /a\n");
+  ASSERT_EQ(chmod(file("kestrel.conf").c_str(), 0666), 0);
+  EXPECT_THAT(failureOf([] { readConfiguration(); }), HasSubstr("every user may write it"));
 }
 
 TEST_F(ConfigurationFile, WhatIsWrongIsNamedWithItsLine) {
@@ -112,7 +172,7 @@ TEST_F(ConfigurationFile, ThatCannotBeReadIsAnError) {
   EXPECT_THAT(failureOf([] { readConfiguration(); }), StartsWith(folder_.path().string()));
 }
 
-// The default place depends on who asks; a child can become somebody else.
+// The default path depends on the user; a child process can become another one.
 std::string defaultPathOfUser(uid_t user, const std::string &dataHome) {
   int ends[2];
   if (pipe(ends) != 0) return "pipe";
@@ -123,7 +183,7 @@ std::string defaultPathOfUser(uid_t user, const std::string &dataHome) {
     } else {
       setenv("XDG_DATA_HOME", dataHome.c_str(), 1);
     }
-    setenv("HOME", "/home/somebody", 1);
+    setenv("HOME", "/home/user", 1);
     std::string path = "no rights";
     if (user == geteuid() || setuid(user) == 0) path = readConfiguration().path;
     _exit(write(ends[1], path.data(), path.size()) < 0);
@@ -148,16 +208,8 @@ TEST_F(ConfigurationFile, TheDefaultStoreOfOthersIsTheirOwn) {
   std::filesystem::permissions(folder_.path(), std::filesystem::perms(0755));
   const uid_t user = geteuid() == 0 ? 65534 : geteuid();
   EXPECT_EQ(defaultPathOfUser(user, "/data"), "/data/kestrel/store.db");
-  EXPECT_EQ(defaultPathOfUser(user, ""), "/home/somebody/.local/share/kestrel/store.db");
-  EXPECT_EQ(defaultPathOfUser(user, "not/absolute"),
-            "/home/somebody/.local/share/kestrel/store.db");
-}
-
-TEST_F(ConfigurationFile, IsComparedByAllItsKeys) {
-  const Configuration one = read("path = /a\n");
-  EXPECT_TRUE(one == read("path = /a\n"));
-  EXPECT_FALSE(one == read("path = /b\n"));
-  EXPECT_FALSE(one == read("path = /a\ntimeout-ms = 7\n"));
+  EXPECT_EQ(defaultPathOfUser(user, ""), "/home/user/.local/share/kestrel/store.db");
+  EXPECT_EQ(defaultPathOfUser(user, "not/absolute"), "/home/user/.local/share/kestrel/store.db");
 }
 
 }  // namespace

@@ -12,14 +12,19 @@ class Echo : public Kestrel::Backend {
   std::optional<Kestrel::Fields> read(const Kestrel::ObjectId &) override {
     return Kestrel::Fields{{"path", path_}};
   }
-  std::vector<Kestrel::StoredObject> list(const Kestrel::Selection &) override { return {}; }
+  Kestrel::Listing list(const Kestrel::Selection &) override { return {}; }
   void setField(const Kestrel::ObjectId &, const std::string &, const Kestrel::Value &) override {
     refuse();
   }
   bool removeField(const Kestrel::ObjectId &, const std::string &) override { refuse(); }
   bool removeObject(const Kestrel::ObjectId &) override { refuse(); }
   void replace(const std::vector<Kestrel::StoredObject> &) override { refuse(); }
-  std::vector<Kestrel::Detail> details() override { return {}; }
+  bool move(const Kestrel::ObjectId &, const std::string &, const std::string &) override {
+    refuse();
+  }
+  Kestrel::Health health() override { return {}; }
+  std::vector<Kestrel::LayerFields> layers(const Kestrel::ObjectId &) override { return {}; }
+  Kestrel::RunSource source() const override { return {}; }
   bool current() override { return true; }
 
  private:
@@ -30,7 +35,7 @@ class Echo : public Kestrel::Backend {
 
 }  // namespace
 
-extern "C" void kestrelModuleOpen1(const Kestrel::Configuration &configuration,
+extern "C" void kestrelModuleOpen2(const Kestrel::Configuration &configuration,
                                    std::shared_ptr<Kestrel::Backend> *result) {
   *result = std::make_shared<Echo>(configuration);
 }

@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 // The exchange format: bytes, types, round trips over every code point, and every refusal.
-#include "kestrel/exchange.h"
-
 #include <gmock/gmock.h>
 
 #include <cmath>
 #include <limits>
 #include <random>
+
+#include "kestrel/exchange_read.h"
+#include "kestrel/exchange_write.h"
 
 namespace Kestrel {
 namespace {
@@ -164,7 +165,7 @@ TEST(Exchange, AValueThatIsNoneIsRefusedWithItsPlace) {
   EXPECT_THAT(fieldRefusal("{a: 1}"), StartsWith("F:1:48: a field is an integer"));
   EXPECT_THAT(fieldRefusal("!calc 1"), StartsWith("F:1:48: unknown tag \"!calc\""));
   EXPECT_THAT(fieldRefusal("99999999999999999999"), StartsWith("F:1:48: \"99999999999999999999\""));
-  EXPECT_THAT(fieldRefusal("!!int 7.5"), StartsWith("F:1:48: \"7.5\" is no integer"));
+  EXPECT_THAT(fieldRefusal("!!int 7.5"), StartsWith("F:1:48: \"7.5\" is not an integer"));
   EXPECT_THAT(fieldRefusal("1, f: 2"), StartsWith("F:1:51: field \"f\" is given twice"));
   EXPECT_THAT(fieldRefusal("1, '': 2"), StartsWith("F:1:55: the field's name is empty"));
 }

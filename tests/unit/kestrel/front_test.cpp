@@ -4,10 +4,13 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <atomic>
 #include <cmath>
 #include <cstdint>
 #include <limits>
 #include <new>
+#include <thread>
+#include <vector>
 
 #include "store_test.h"
 
@@ -21,7 +24,7 @@ using ::testing::HasSubstr;
 
 class Front : public StoreTest {};
 
-TEST_F(Front, AMissingFileIsNoStoreAndIsNotMade) {
+TEST_F(Front, AMissingFileIsNotMade) {
   EXPECT_EQ(store(), nullptr);
   EXPECT_FALSE(std::filesystem::exists(path()));
 }
@@ -38,7 +41,7 @@ TEST_F(Front, AMissingObjectIsEmpty) {
   EXPECT_EQ(store()->GetObject({}), nullptr);
 }
 
-TEST_F(Front, EachPartOfAnIdTellsObjectsApart) {
+TEST_F(Front, EachPartOfAnIdDistinguishesObjects) {
   const auto backend = openBackend(Access::kCreate);
   backend->setField({"k", "c", "g", "e"}, "x", int64_t{1});
   for (const ObjectId &other : {ObjectId{"K", "c", "g", "e"}, ObjectId{"k", "C", "g", "e"},
@@ -58,7 +61,7 @@ TEST_F(Front, AMissingFieldLeavesTheResultUntouched) {
   EXPECT_EQ(real, 4.5);
 }
 
-TEST_F(Front, AnIntegerAnswersBothReads) {
+TEST_F(Front, AnIntegerIsReadByBothReads) {
   put("x", int64_t{7});
   long whole = 0;
   double real = 0;
@@ -78,7 +81,7 @@ TEST_F(Front, IntegersKeepAll64Bits) {
   }
 }
 
-TEST_F(Front, ARealAnswersOnlyTheRealRead) {
+TEST_F(Front, ARealIsReadOnlyByTheRealRead) {
   put("x", 7.0);
   long whole = 42;
   double real = 0;
@@ -106,7 +109,7 @@ TEST_F(Front, ARealMayBeNotANumber) {
   EXPECT_TRUE(std::isnan(real));
 }
 
-TEST_F(Front, TextsAndTruthValuesAnswerNeitherRead) {
+TEST_F(Front, TextsAndTruthValuesAreReadByNeitherRead) {
   for (const Value &value : {Value(true), Value(std::string("7")), Value(std::string())}) {
     put("x", value);
     long whole = 0;
@@ -149,7 +152,7 @@ TEST_F(Front, AStoreThatAppearsLaterIsFound) {
   EXPECT_NE(store(), nullptr);
 }
 
-TEST_F(Front, AStoreThatWasReplacedIsOpenedAnew) {
+TEST_F(Front, AReplacedStoreIsOpenedAgain) {
   put("x", int64_t{1});
   ASSERT_NE(object(), nullptr);
   std::filesystem::rename(path(), file("old.db"));
@@ -162,11 +165,22 @@ TEST_F(Front, AStoreThatWasReplacedIsOpenedAnew) {
   EXPECT_EQ(whole, 2);
 }
 
-TEST_F(Front, AChangedConfigurationNamesAnotherStore) {
+TEST_F(Front, TheConfigurationIsReadOnceARun) {
   put("x", int64_t{1});
   ASSERT_NE(object(), nullptr);
   configure("path = " + file("other.db") + "\n");
-  EXPECT_EQ(store(), nullptr);
+  EXPECT_NE(object(), nullptr);
+  configure("nonsense\n");
+  EXPECT_NE(object(), nullptr);
+}
+
+TEST_F(Front, ABadConfigurationIsBadForTheWholeRun) {
+  const std::string good = "path = " + path() + "\n";
+  put("x", int64_t{1});
+  configure("nonsense\n");
+  EXPECT_NE(failureOf([] { store(); }), "");
+  configure(good);
+  EXPECT_NE(failureOf([] { store(); }), "");
 }
 
 TEST_F(Front, ABadConfigurationIsAFailureWithFileAndLine) {
@@ -177,9 +191,25 @@ TEST_F(Front, ABadConfigurationIsAFailureWithFileAndLine) {
 TEST_F(Front, AHeldStoreReadsOnAfterAnotherWasOpened) {
   put("x", int64_t{1});
   const auto held = store();
-  configure("path = " + file("other.db") + "\n");
+  std::filesystem::rename(path(), file("old.db"));
   EXPECT_EQ(store(), nullptr);
   EXPECT_NE(held->GetObject(id("backup")), nullptr);
+}
+
+TEST_F(Front, SeveralThreadsReadAtTheSameTime) {
+  put("x", int64_t{1});
+  std::atomic<int> found{0};
+  std::vector<std::thread> threads;
+  for (int i = 0; i < 4; ++i) {
+    threads.emplace_back([&found] {
+      for (int round = 0; round < 100; ++round) {
+        long whole = 0;
+        if (object()->GetValue("x", &whole) && whole == 1) ++found;
+      }
+    });
+  }
+  for (std::thread &thread : threads) thread.join();
+  EXPECT_EQ(found, 400);
 }
 
 TEST_F(Front, AChildProcessOpensAStoreOfItsOwn) {

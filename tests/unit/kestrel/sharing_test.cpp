@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The store between processes: readers beside a writer, readers without rights, and files that
-// SQLite itself could not read where they stand.
+// SQLite itself cannot open where they are.
 #include <gmock/gmock.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -16,17 +16,17 @@ namespace {
 
 using ::testing::HasSubstr;
 
-constexpr uid_t kNobody = 65534;
+constexpr uid_t kNobodyId = 65534;
 
 class SharedStore : public StoreTest {
  protected:
   SharedStore() { std::filesystem::permissions(folder_.path(), std::filesystem::perms(0755)); }
 
-  // Runs CLAIM in a process of its own; as nobody when this one is root.
+  // Runs CLAIM in a process of its own; as the user "nobody" when this one is root.
   static bool holdsForNobody(const std::function<bool()> &claim) {
     const pid_t child = fork();
     if (child == 0) {
-      if (geteuid() == 0 && setuid(kNobody) != 0) _exit(2);
+      if (geteuid() == 0 && setuid(kNobodyId) != 0) _exit(2);
       bool holds = false;
       try {
         holds = claim();
@@ -102,13 +102,13 @@ TEST_F(SharedStore, ManyProcessesMakeOneStore) {
 }
 
 TEST_F(SharedStore, AUserWithoutRightsReadsTheHostsStore) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   put("x", int64_t{1});
   EXPECT_TRUE(holdsForNobody(readsOne));
 }
 
 TEST_F(SharedStore, AUserWithoutRightsReadsBesideAWriter) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   put("x", int64_t{2});
   Platform::Database writer(path(), Platform::Database::Mode::kReadWrite, 0);
   writer.execute("UPDATE field SET value = 1; BEGIN IMMEDIATE; UPDATE field SET value = 3");
@@ -116,16 +116,16 @@ TEST_F(SharedStore, AUserWithoutRightsReadsBesideAWriter) {
   writer.execute("COMMIT");
 }
 
-TEST_F(SharedStore, AUserWithoutRightsReadsAStoreThatStandsAlone) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+TEST_F(SharedStore, AUserWithoutRightsReadsAStoreWithoutItsLog) {
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   put("x", int64_t{1});
   removeFilesBeside();
   EXPECT_TRUE(holdsForNobody(readsOne));
   EXPECT_FALSE(std::filesystem::exists(path() + "-wal"));
 }
 
-TEST_F(SharedStore, AStoreThatStandsAloneIsReadAnewAfterAChange) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+TEST_F(SharedStore, AStoreWithoutItsLogIsReadAgainAfterAChange) {
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   put("x", int64_t{2});
   removeFilesBeside();
   int ends[2];
@@ -135,7 +135,7 @@ TEST_F(SharedStore, AStoreThatStandsAloneIsReadAnewAfterAChange) {
   const pid_t child = fork();
   if (child == 0) {
     char byte = 0;
-    if (setuid(kNobody) != 0) _exit(2);
+    if (setuid(kNobodyId) != 0) _exit(2);
     const auto held = store();
     long whole = 0;
     const bool before = held->GetObject(id("backup"))->GetValue("x", &whole) && whole == 2;
@@ -152,7 +152,7 @@ TEST_F(SharedStore, AStoreThatStandsAloneIsReadAnewAfterAChange) {
   EXPECT_EQ(status, 0);
 }
 
-TEST_F(SharedStore, AnUnreadableFileIsAFailureAndNoMissingStore) {
+TEST_F(SharedStore, AnUnreadableFileIsAFailureNotAMissingStore) {
   put("x", int64_t{1});
   ASSERT_EQ(chmod(path().c_str(), 0), 0);
   EXPECT_TRUE(holdsForNobody([] {
@@ -161,7 +161,7 @@ TEST_F(SharedStore, AnUnreadableFileIsAFailureAndNoMissingStore) {
   }));
 }
 
-TEST_F(SharedStore, AnUnreachableFolderIsAFailureAndNoMissingStore) {
+TEST_F(SharedStore, AnUnreachableFolderIsAFailureNotAMissingStore) {
   std::filesystem::create_directory(file("closed"));
   configure("path = " + file("closed/store.db") + "\n");
   ASSERT_EQ(chmod(file("closed").c_str(), 0), 0);
@@ -171,14 +171,14 @@ TEST_F(SharedStore, AnUnreachableFolderIsAFailureAndNoMissingStore) {
 }
 
 TEST_F(SharedStore, AUserWithoutRightsChangesNothing) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   put("x", int64_t{1});
   EXPECT_TRUE(holdsForNobody([] { return !failureOf([] { put("x", int64_t{2}); }).empty(); }));
   EXPECT_TRUE(readsOne());
 }
 
-TEST_F(SharedStore, AStoreCannotBeMadeWhereOneMayNotWrite) {
-  if (geteuid() != 0) GTEST_SKIP() << "not root: there is nobody with fewer rights";
+TEST_F(SharedStore, AStoreIsNotMadeWhereTheUserMayNotWrite) {
+  if (geteuid() != 0) GTEST_SKIP() << "not root: no user has fewer rights";
   EXPECT_TRUE(holdsForNobody([] {
     return failureOf([] { put("x", int64_t{2}); }).find("cannot be made") != std::string::npos;
   }));
@@ -188,13 +188,13 @@ TEST_F(SharedStore, AStoreCannotBeMadeWhereOneMayNotWrite) {
   }));
 }
 
-TEST_F(SharedStore, ALockedFileIsAFailureThatSaysSo) {
+TEST_F(SharedStore, TheFailureOfALockedFileNamesTheLock) {
   put("x", int64_t{1});
   sql("PRAGMA journal_mode = DELETE");
   Platform::Database other(path(), Platform::Database::Mode::kReadWrite, 0);
   other.execute("BEGIN EXCLUSIVE");
   configure("path = " + path() + "\ntimeout-ms = 1\n");
-  EXPECT_THAT(failureOf([] { store(); }), HasSubstr("another process keeps it locked"));
+  EXPECT_THAT(failureOf([] { store(); }), HasSubstr("another process has locked it"));
 }
 
 }  // namespace

@@ -1,8 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// The SQLite file: what is no store, what is a damaged one, what the tables themselves refuse, and
-// the changes.
+// The SQLite file: files that are not a store or a damaged one, what the tables themselves refuse,
+// and the changes.
 #include <gmock/gmock.h>
+#include <sys/resource.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <csignal>
 #include <fstream>
 
 #include "common/sqlite.h"
@@ -17,7 +21,7 @@ using ::testing::StartsWith;
 
 class SqliteStore : public StoreTest {
  protected:
-  // What opening and reading the store answers.
+  // The failure of opening and reading the store.
   std::string failure() const {
     const std::string text = failureOf([] { openBackend(Access::kRead)->read(id("backup")); });
     EXPECT_THAT(text, StartsWith(path() + ": "));
@@ -26,24 +30,24 @@ class SqliteStore : public StoreTest {
 
   static std::string keys(const Selection &selection) {
     std::string text;
-    for (const StoredObject &object : openBackend(Access::kRead)->list(selection)) {
+    for (const StoredObject &object : openBackend(Access::kRead)->list(selection).objects) {
       text += describe(object.id) + " ";
     }
     return text;
   }
 };
 
-TEST_F(SqliteStore, AnEmptyFileIsNoStore) {
+TEST_F(SqliteStore, AnEmptyFileIsNotAStore) {
   ::Test::writeFile(path(), "");
-  EXPECT_THAT(failure(), HasSubstr("no configuration store"));
+  EXPECT_THAT(failure(), HasSubstr("not a configuration store"));
 }
 
-TEST_F(SqliteStore, AnotherProgramsDatabaseIsNoStore) {
+TEST_F(SqliteStore, AnotherProgramsDatabaseIsNotAStore) {
   sql("CREATE TABLE t (x); PRAGMA user_version = 1");
-  EXPECT_THAT(failure(), HasSubstr("no configuration store"));
+  EXPECT_THAT(failure(), HasSubstr("not a configuration store"));
 }
 
-TEST_F(SqliteStore, AFileThatIsNoDatabaseIsDamaged) {
+TEST_F(SqliteStore, AFileThatIsNotADatabaseIsDamaged) {
   ::Test::writeFile(path(), std::string(8192, 'x'));
   EXPECT_THAT(failure(), HasSubstr("the file is damaged"));
 }
@@ -72,7 +76,7 @@ TEST_F(SqliteStore, AnotherSchemaVersionIsLeftAlone) {
 
 TEST_F(SqliteStore, AFolderInItsPlaceIsAFailure) {
   std::filesystem::create_directory(path());
-  EXPECT_THAT(failure(), HasSubstr("no regular file"));
+  EXPECT_THAT(failure(), HasSubstr("not a regular file"));
 }
 
 TEST_F(SqliteStore, APathThroughAFileIsAFailure) {
@@ -85,7 +89,7 @@ TEST_F(SqliteStore, ItsFolderIsMadeWithTheStore) {
   configure("path = " + file("a/b/store.db") + "\n");
   put("x", int64_t{1});
   EXPECT_TRUE(std::filesystem::exists(file("a/b/store.db")));
-  EXPECT_EQ(openBackend(Access::kRead)->list({}).size(), 1U);
+  EXPECT_EQ(openBackend(Access::kRead)->list({}).objects.size(), 1U);
 }
 
 TEST_F(SqliteStore, MakingItLeavesNothingBeside) {
@@ -97,7 +101,29 @@ TEST_F(SqliteStore, MakingItLeavesNothingBeside) {
   }
 }
 
-TEST_F(SqliteStore, TheWholeStoreStandsInItsOneFileAfterAChange) {
+// A limit of the file size fails the writes as a full disk does, at each size in turn.
+TEST_F(SqliteStore, AFirstUseThatFailsLeavesNothingBehind) {
+  for (rlim_t limit = 0; limit <= 65536; limit += 1024) {
+    const pid_t child = fork();
+    if (child == 0) {
+      const rlimit size{limit, limit};
+      signal(SIGXFSZ, SIG_IGN);
+      if (setrlimit(RLIMIT_FSIZE, &size) != 0) _exit(2);
+      _exit(failureOf([] { openBackend(Access::kCreate); }).empty() ? 0 : 1);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    ASSERT_TRUE(status == 0 || WEXITSTATUS(status) == 1) << status;
+    for (const auto &entry : std::filesystem::directory_iterator(folder_.path())) {
+      ASSERT_EQ(entry.path().string().find(".new-"), std::string::npos) << entry.path();
+    }
+    put("x", int64_t{1});
+    ASSERT_EQ(openBackend(Access::kRead)->read(id("backup")), (Fields{{"x", int64_t{1}}})) << limit;
+    for (const char *ending : {"", "-wal", "-shm"}) std::filesystem::remove(path() + ending);
+  }
+}
+
+TEST_F(SqliteStore, TheWholeStoreIsInOneFileAfterAChange) {
   put("x", int64_t{1});
   put("y", std::string("text"));
   std::filesystem::copy_file(path(), file("copy.db"));
@@ -105,14 +131,14 @@ TEST_F(SqliteStore, TheWholeStoreStandsInItsOneFileAfterAChange) {
   EXPECT_EQ(openBackend(Access::kRead)->read(id("backup"))->size(), 2U);
 }
 
-TEST_F(SqliteStore, APathMayHoldWhatAnUriMayNot) {
+TEST_F(SqliteStore, APathMayHoldWhatAUriMayNot) {
   configure("path = " + file("50%20?a=b#c.db") + "\n");
   put("x", int64_t{1});
   EXPECT_NE(openBackend(Access::kRead)->read(id("backup")), std::nullopt);
   EXPECT_TRUE(std::filesystem::exists(file("50%20?a=b#c.db")));
 }
 
-TEST_F(SqliteStore, ItsTablesRefuseWhatIsNoValueOfItsType) {
+TEST_F(SqliteStore, ItsTablesRefuseAValueOfAnotherType) {
   put("x", int64_t{1});
   for (const char *row :
        {"'integer', 'text'", "'integer', 1.5", "'real', 1", "'real', 'x'", "'boolean', 2",
@@ -131,7 +157,18 @@ TEST_F(SqliteStore, ItsTablesRefuseWhatIsNoValueOfItsType) {
 TEST_F(SqliteStore, AValueThatGotPastTheChecksIsDamage) {
   put("x", int64_t{1});
   sql("PRAGMA ignore_check_constraints = ON; UPDATE field SET value = 'seven'");
-  EXPECT_THAT(failure(), HasSubstr("field \"x\" holds no integer"));
+  EXPECT_THAT(failure(), HasSubstr("field \"x\" does not hold a value of type integer"));
+}
+
+TEST_F(SqliteStore, ADamagedObjectDoesNotHideTheOthers) {
+  put("x", int64_t{1});
+  openBackend(Access::kCreate)->setField(id("other"), "y", int64_t{2});
+  sql("PRAGMA ignore_check_constraints = ON; UPDATE field SET value = 'seven' WHERE name = 'x'");
+  const Listing listing = openBackend(Access::kRead)->list({});
+  ASSERT_EQ(listing.objects.size(), 1U);
+  EXPECT_EQ(listing.objects[0].id.key, "other");
+  ASSERT_EQ(listing.damaged.size(), 1U);
+  EXPECT_EQ(listing.damaged[0].name, "host/pools/backup");
 }
 
 TEST_F(SqliteStore, AFieldChangesItsTypeWithItsValue) {
@@ -196,7 +233,7 @@ TEST_F(SqliteStore, ObjectsAreListedInByteOrderAndBySelection) {
   EXPECT_EQ(keys({"none", {}}), "");
 }
 
-TEST_F(SqliteStore, ReplacingTakesTheWholeObjectAndLeavesOthers) {
+TEST_F(SqliteStore, AReplacementTakesTheWholeObjectAndLeavesOthers) {
   put("x", int64_t{1});
   const auto backend = openBackend(Access::kCreate);
   backend->setField(id("other"), "x", int64_t{1});
@@ -206,7 +243,7 @@ TEST_F(SqliteStore, ReplacingTakesTheWholeObjectAndLeavesOthers) {
   EXPECT_EQ(backend->read(id("new")), Fields{});
 }
 
-TEST_F(SqliteStore, AReplacingThatFailsHalfwayChangesNothing) {
+TEST_F(SqliteStore, AReplacementThatFailsHalfwayChangesNothing) {
   put("x", int64_t{1});
   sql("CREATE TRIGGER refuse BEFORE INSERT ON field WHEN NEW.name = 'bad'"
       " BEGIN SELECT RAISE(ABORT, 'refused'); END");
@@ -227,13 +264,13 @@ TEST_F(SqliteStore, AnInspectionCountsAndChecks) {
   EXPECT_EQ(report.problem, "");
   std::string text;
   for (const auto &[label, value] : report.details) {
-    if (label != "answers in") text += label + "=" + value + " ";
+    if (label != "responds in") text += label + "=" + value + " ";
   }
-  EXPECT_EQ(text, "configuration=" + file("kestrel.conf") + " store=sqlite place=" + path() +
+  EXPECT_EQ(text, "configuration=" + file("kestrel.conf") + " store=sqlite location=" + path() +
                       " schema=version 1 objects=1 fields=2 ");
 }
 
-TEST_F(SqliteStore, AnInspectionTellsAMissingStoreFromABadOne) {
+TEST_F(SqliteStore, AnInspectionDistinguishesAMissingStoreFromABadOne) {
   EXPECT_EQ(inspect().condition, Condition::kMissing);
   ::Test::writeFile(path(),
                     "no database, but long enough to be read as the head of one, is it not?"
@@ -250,11 +287,11 @@ TEST_F(SqliteStore, AnInspectionOfAnotherEngineNamesItsAddresses) {
   const Report report = inspect();
   EXPECT_EQ(report.condition, Condition::kUnusable);
   EXPECT_THAT(report.details,
-              ::testing::Contains(Detail("place", "http://127.0.0.1:1, http://127.0.0.1:2")));
+              ::testing::Contains(Detail("location", "http://127.0.0.1:1, http://127.0.0.1:2")));
   EXPECT_NE(report.problem, "");
 }
 
-TEST_F(SqliteStore, AStoreOfAnotherStateIsNoLongerCurrent) {
+TEST_F(SqliteStore, AReplacedStoreIsNoLongerCurrent) {
   put("x", int64_t{1});
   const auto backend = openBackend(Access::kRead);
   EXPECT_TRUE(backend->current());

@@ -42,16 +42,22 @@ TEST_F(KnobConf, AnEmptyFileMeansTheDefaults) {
   EXPECT_FALSE(configuration.statePath);
   EXPECT_EQ(configuration.cgroupRoot, "");
   EXPECT_EQ(configuration.maxVms, 1024U);
+  EXPECT_FALSE(configuration.reserve.memoryMB);
+  EXPECT_FALSE(configuration.reserve.cpuPercent);
   EXPECT_EQ(configuration.source, file_);
 }
 
 TEST_F(KnobConf, EveryKeyIsRead) {
-  write("kernel = linux\nstate = /x/y.db\ncgroup-root = some.slice\nmax-vms = 4294967295\n");
+  write(
+      "kernel = linux\nstate = /x/y.db\ncgroup-root = some.slice\nmax-vms = 4294967295\n"
+      "reserve-memory = 100\nreserve-cpu = 0\n");
   const Configuration configuration = readConfiguration();
   EXPECT_EQ(configuration.kernel, Configuration::KernelKind::kLinux);
   EXPECT_EQ(configuration.statePath, "/x/y.db");
   EXPECT_EQ(configuration.cgroupRoot, "some.slice");
   EXPECT_EQ(configuration.maxVms, UINT32_MAX);
+  EXPECT_EQ(configuration.reserve.memoryMB, 100);
+  EXPECT_EQ(configuration.reserve.cpuPercent, 0);
 }
 
 TEST_F(KnobConf, TheEmulatedKernelCanBeNamed) {

@@ -97,6 +97,30 @@ TEST(Admission, TheLargerOfOwnMinAndChildrenIsReserved) {
   EXPECT_EQ(reservationOf(state(3, -1, -1, 5)), 5);
 }
 
+TEST(Admission, ARefusalNamesTheGroupAndBothAmounts) {
+  Refusal refusal{};
+  const auto refusedAt = [&](const std::vector<ResourceState> &states, int64_t min) {
+    Allocation wanted = states.front().allocation;
+    wanted.min = min;
+    EXPECT_FALSE(admit(states, wanted, 100, &refusal));
+    return refusal.at;
+  };
+  EXPECT_EQ(refusedAt({state(2, -1, 10, 0)}, 15), 0U);
+  EXPECT_EQ(refusal.asked, 13);
+  EXPECT_EQ(refusal.free, 8);
+  EXPECT_EQ(refusedAt({state(0, -1, -1, 0), state(0, 40, -1, 30)}, 15), 1U);
+  EXPECT_EQ(refusal.asked, 15);
+  EXPECT_EQ(refusal.free, 10);
+  EXPECT_EQ(refusedAt({state(0, -1, -1, 0), state(0, -1, -1, 90)}, 15), 2U) << "the machine";
+  EXPECT_EQ(refusal.asked, 15);
+  EXPECT_EQ(refusal.free, 10);
+}
+
+TEST(Admission, ASumNeverGoesBelow0) {
+  EXPECT_EQ(changedSum(10, 99, 3), 3);
+  EXPECT_EQ(changedSum(10, 4, 0), 6);
+}
+
 TEST(Admission, TheMachineHas100PercentForEachCpuAndItsWholeMegabytes) {
   HostFacts facts;
   facts.cpus = 3;

@@ -26,6 +26,7 @@
 #include "knob/linux/cgroup_tree.h"
 #include "knob/linux/fixed_groups.h"
 #include "knob/linux/linux_kernel.h"
+#include "knob/linux/oom_score.h"
 #include "knob/linux/record.h"
 #include "knob/linux/tree_lock.h"
 #include "knob/signature.h"
@@ -99,6 +100,7 @@ class Member {
     ::kill(pid_, SIGKILL);
     ::waitpid(pid_, nullptr, 0);
   }
+  pid_t pid() const { return pid_; }
   Member(const Member &) = delete;
   Member &operator=(const Member &) = delete;
 
@@ -586,6 +588,210 @@ TEST_F(OnLinux, AnotherInterfaceNeedsRepairOrATreeWithoutPools) {
 TEST_F(OnLinux, ReadingTheSignatureMakesNoGroup) {
   EXPECT_EQ(kernel_->signature().md5, buildSignature().md5);
   EXPECT_FALSE(std::filesystem::exists(kMount / "host"));
+}
+
+// ---- what the machine can promise
+
+TEST_F(OnLinux, WhatAnotherSliceProtectsIsNotPromisedAgain) {
+  configuration_.reserve = {20, 0};
+  kernel_ = open();
+  const GroupId id = create("host/opt", "pool");
+  ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+  write("theirs", "memory.min", "104857600");
+  std::string text;
+  EXPECT_EQ(statusOfCall([&] { setMemory(id, 150, -1); }, &text), Status::kReservationRefused);
+  EXPECT_THAT(text, testing::MatchesRegex("150 MB asked for, [0-9]+ MB free on the machine: 20 MB "
+                                          "for the system, 100 MB for /sys/fs/cgroup/theirs"));
+  EXPECT_EQ(fileText("host", "memory.min"), "0");
+}
+
+TEST_F(OnLinux, WhatAnotherSliceProtectsLaterIsReportedAsOverPromised) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 100, -1);
+  ASSERT_EQ(::mkdir((kMount / "theirs").c_str(), 0755), 0);
+  write("theirs", "memory.min", "104857600");
+  const auto lines = [&] {
+    kernel_ = open();
+    return check(true);
+  }();
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_THAT(lines[0], HasSubstr("more is promised than the machine can give"));
+  EXPECT_THAT(lines[0], HasSubstr("100 MB for /sys/fs/cgroup/theirs"));
+  setMemory(id, 0, -1);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, ARefusalNamesTheGroupWithoutRoomAndItsHolders) {
+  const GroupId parent = create("host/opt", "parent");
+  setMemory(parent, 0, 50);
+  setMemory(create("host/opt/parent", "a"), 30, -1);
+  std::string text;
+  const GroupId b = create("host/opt/parent", "b");
+  EXPECT_EQ(statusOfCall([&] { setMemory(b, 25, -1); }, &text), Status::kReservationRefused);
+  EXPECT_EQ(text, "25 MB asked for, 20 MB free in host/opt/parent: 30 MB for host/opt/parent/a");
+}
+
+TEST_F(OnLinux, TheStatusHasTheWholeAccount) {
+  configuration_.reserve = {20, 10};
+  kernel_ = open();
+  setMemory(create("host/opt", "pool"), 30, -1);
+  const LinuxHost host = lookAtLinuxHost(configuration_);
+  ASSERT_EQ(host.account.size(), 3U);
+  EXPECT_THAT(host.account[0].second,
+              testing::MatchesRegex("[0-9]+ MB: 20 MB for the system; [0-9]+ MB for groups, which "
+                                    "reserve 30 MB"));
+  EXPECT_EQ(host.account[1].second,
+            "100 % of a CPU: 10 % of a CPU for the system; 90 % of a CPU "
+            "for groups, which reserve 0 % of a CPU");
+}
+
+// The machine's own mount has no memory_recursiveprot.
+TEST_F(OnLinux, AMinimumThatDoesNotProtectTheChildrenIsReported) {
+  const GroupId parent = create("host/opt", "parent");
+  setMemory(parent, 100, -1);
+  EXPECT_TRUE(check(false).empty()) << "without children it protects the group itself";
+  const GroupId child = create("host/opt/parent", "child");
+  setMemory(child, 40, -1);
+  const auto lines = check(false);
+  ASSERT_EQ(lines.size(), 1U);
+  EXPECT_THAT(lines[0], HasSubstr("host/opt/parent: 60 MB of its memory minimum protect nothing"));
+  EXPECT_EQ(lookAtLinuxHost(configuration_).account[2].first, "protection");
+  setMemory(child, 100, -1);
+  EXPECT_TRUE(check(false).empty());
+}
+
+// ---- a delegated directory
+
+class Delegated : public OnLinux {
+ protected:
+  static constexpr uid_t kUser = 12345;
+
+  void SetUp() override {
+    OnLinux::SetUp();
+    other_ = create("host/opt", "other");
+    setMemory(other_, 30, -1);
+    setCpuMin(other_, 20);
+    theirs_ = create("host/opt", "theirs");
+    setMemory(theirs_, 10, -1);
+    setCpuMin(theirs_, 5);
+    ASSERT_EQ(::chown((kMount / "host/opt/theirs").c_str(), kUser, kUser), 0);
+  }
+
+  // As the owner of the directory.
+  void writeRecordOf(int64_t memoryMin, int64_t cpuMin, int64_t childrenSum) {
+    elsewhere([&] {
+      ASSERT_EQ(::setuid(kUser), 0);
+      Record record = *decode(attribute("host/opt/theirs", kRecordAttribute));
+      record.memory = {{memoryMin, -1, -1, -3}, childrenSum};
+      record.cpu = {{cpuMin, -1, -1, -3}, childrenSum};
+      const RecordBytes bytes = encode(record);
+      setAttribute("host/opt/theirs", kRecordAttribute, {bytes.data(), bytes.size()});
+    });
+  }
+
+  // Only the other group is left, with all that it reserved.
+  void expectOnlyTheOther() {
+    EXPECT_EQ(fileText("host", "memory.min"), "31457280");
+    const Record opt = *decode(attribute("host/opt", kRecordAttribute));
+    EXPECT_EQ(opt.memory.childrenSum, 30);
+    EXPECT_EQ(opt.cpu.childrenSum, 20);
+    EXPECT_TRUE(check(false).empty());
+  }
+
+  GroupId other_ = 0, theirs_ = 0;
+};
+
+TEST_F(Delegated, ARecordThatClaimsMoreReleasesOnlyWhatWasCounted) {
+  for (const int64_t claimed : {11, 35, 1000000}) {
+    SCOPED_TRACE(claimed);
+    writeRecordOf(claimed, claimed, 0);
+    kernel_->remove(theirs_);
+    expectOnlyTheOther();
+    theirs_ = create("host/opt", "theirs");
+    setMemory(theirs_, 10, -1);
+    setCpuMin(theirs_, 5);
+    ASSERT_EQ(::chown((kMount / "host/opt/theirs").c_str(), kUser, kUser), 0);
+  }
+}
+
+TEST_F(Delegated, ASumThatTheOwnerWroteReleasesOnlyWhatWasCounted) {
+  writeRecordOf(10, 5, 1000000);
+  kernel_->remove(theirs_);
+  expectOnlyTheOther();
+}
+
+TEST_F(Delegated, ARecordThatClaimsMoreIsNotBelievedByRepair) {
+  writeRecordOf(1000, 1000, 0);
+  (void)check(true);
+  EXPECT_EQ(fileText("host", "memory.min"), "41943040");
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(Delegated, AChangeOfItsMinimumTakesNothingFromTheOthers) {
+  writeRecordOf(1000000, 1000000, 0);
+  setMemory(theirs_, 4, -1);
+  setCpuMin(theirs_, 4);
+  EXPECT_EQ(fileText("host", "memory.min"), "35651584");
+  kernel_->remove(theirs_);
+  expectOnlyTheOther();
+}
+
+// ---- the machine out of memory
+
+int adjOf(pid_t pid) {
+  std::ifstream file("/proc/" + std::to_string(pid) + "/oom_score_adj");
+  int value = 1;
+  file >> value;
+  return value;
+}
+
+int adjFor(int64_t minMB) {
+  return oomScoreAdjFor(minMB, oomMachineBytes());
+}
+
+TEST_F(OnLinux, MembersFollowTheMinimumOfTheirGroup) {
+  const GroupId id = create("host/opt", "pool");
+  const Member member("");
+  kernel_->join(id, member.pid());
+  EXPECT_EQ(adjOf(member.pid()), 0);
+  for (const int64_t min : {20, 60, 10, 0}) {
+    setMemory(id, min, -1);
+    EXPECT_EQ(adjOf(member.pid()), adjFor(min)) << min;
+  }
+  EXPECT_LT(adjFor(20), 0);
+}
+
+TEST_F(OnLinux, AProcessThatMovesGetsTheValueOfItsNewGroup) {
+  const GroupId large = create("host/opt", "large"), small = create("host/opt", "small");
+  const GroupId none = create("host/opt", "none");
+  setMemory(large, 60, -1);
+  setMemory(small, 20, -1);
+  const Member member("");
+  for (const auto &[id, min] : {std::pair(large, 60), std::pair(small, 20), std::pair(none, 0)}) {
+    kernel_->join(id, member.pid());
+    EXPECT_EQ(adjOf(member.pid()), adjFor(min)) << min;
+  }
+}
+
+TEST_F(OnLinux, AnOomScoreAdjThatAnotherProgramChoseIsKept) {
+  const GroupId id = create("host/opt", "pool");
+  setMemory(id, 60, -1);
+  const Member member("");
+  std::ofstream("/proc/" + std::to_string(member.pid()) + "/oom_score_adj") << 7;
+  kernel_->join(id, member.pid());
+  setMemory(id, 20, -1);
+  EXPECT_EQ(adjOf(member.pid()), 7);
+  EXPECT_TRUE(check(false).empty());
+}
+
+TEST_F(OnLinux, AGroupWithAMinimumIsMarkedForSystemdOomd) {
+  const GroupId id = create("host/opt", "pool");
+  for (const int64_t min : {20, 0}) {
+    setMemory(id, min, -1);
+    for (const char *mark : {"user.oomd_avoid", "user.oomd_omit"}) {
+      EXPECT_EQ(attribute("host/opt/pool", mark), min == 0 ? "" : "1");
+    }
+  }
 }
 
 // ---- what a process keeps open

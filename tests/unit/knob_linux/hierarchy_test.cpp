@@ -88,6 +88,12 @@ bool contains(const std::string &text, const std::string &part) {
   return text.find(part) != std::string::npos;
 }
 
+TEST(MountInfo, RecursiveProtectionIsAnOptionOfTheFileSystem) {
+  const std::string line = "41 31 0:38 / /sys/fs/cgroup rw - cgroup2 none rw";
+  EXPECT_FALSE(parseMountInfo(line + "\n").unified[0].protectsRecursively);
+  EXPECT_TRUE(parseMountInfo(line + ",memory_recursiveprot\n").unified[0].protectsRecursively);
+}
+
 TEST(MissingControllers, IsEmptyWhereBothAreEnabled) {
   EXPECT_EQ(missingControllers("cpuset cpu io memory pids", {}, "/sys/fs/cgroup", true), "");
 }
