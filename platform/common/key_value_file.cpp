@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads the `key = value` form. What a key means is its reader's business.
+// Reads the `key = value` form. The caller interprets keys and values.
 #include "common/key_value_file.h"
 
 #include <algorithm>
-#include <cerrno>
-#include <charconv>
 #include <system_error>
 
+#include "common/number.h"
 #include "common/read_file.h"
 
 namespace Platform {
@@ -14,7 +13,7 @@ namespace {
 
 constexpr std::string_view kBlanks = " \t\r";
 // Far more than any sane configuration; keeps a mistaken path from filling the memory.
-constexpr size_t kMostBytes = 1 << 20;
+constexpr size_t kMaxBytes = 1 << 20;
 
 std::string_view trimmed(std::string_view text) {
   const size_t first = text.find_first_not_of(kBlanks);
@@ -60,9 +59,9 @@ std::optional<KeyValueFile> KeyValueFile::read(const std::string &fileName,
                                                std::initializer_list<std::string_view> knownKeys) {
   std::string text;
   try {
-    text = readFile(fileName, kMostBytes);
+    text = readRegularFile(fileName, kMaxBytes);
   } catch (const std::system_error &error) {
-    if (error.code().value() == ENOENT) return std::nullopt;
+    if (error.code() == std::errc::no_such_file_or_directory) return std::nullopt;
     throw ConfigError(fileName + ": " + error.code().message());
   }
   return parse(text, fileName, knownKeys);
@@ -104,16 +103,13 @@ std::optional<std::string> KeyValueFile::oneOf(
   return value;
 }
 
-std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t least,
-                                             int64_t most) const {
+std::optional<int64_t> KeyValueFile::integer(std::string_view key, int64_t min, int64_t max) const {
   const Entry *entry = find(key);
   if (entry == nullptr) return std::nullopt;
-  int64_t number = 0;
-  const char *end = entry->value.data() + entry->value.size();
-  const auto [stop, error] = std::from_chars(entry->value.data(), end, number);
-  if (error != std::errc() || stop != end || number < least || number > most) {
+  const auto number = parseNumber<int64_t>(entry->value);
+  if (!number || *number < min || *number > max) {
     refuse(key, "bad value " + quoted(entry->value) + " (a whole number from " +
-                    std::to_string(least) + " to " + std::to_string(most) + ")");
+                    std::to_string(min) + " to " + std::to_string(max) + ")");
   }
   return number;
 }

@@ -42,8 +42,8 @@ class KeyValueFile {
   std::optional<std::string> oneOf(std::string_view key,
                                    std::initializer_list<std::string_view> choices) const;
 
-  // The same, for a whole decimal number from least to most.
-  std::optional<int64_t> integer(std::string_view key, int64_t least, int64_t most) const;
+  // The same, for a whole decimal number from min to max.
+  std::optional<int64_t> integer(std::string_view key, int64_t min, int64_t max) const;
 
   // The same, for a path that begins at the root.
   std::optional<std::string> absolutePath(std::string_view key) const;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Thin: every call here is one call of SQLite and the check of its answer.
+// Thin: every function here is one call of SQLite and the check of its result.
 #include "common/sqlite.h"
 
 #include <chrono>
@@ -30,23 +30,22 @@ std::string immutableUri(const std::string &path) {
   return uri + "?immutable=1";
 }
 
-// SQLite's own waits grow to tenths of a second, while what is waited for lasts microseconds.
-int waitForOthers(void *busyMs, int round) {
+}  // namespace
+
+// SQLite's own waits grow to tenths of a second, while other processes need microseconds.
+int Database::waitForOthers(void *wait, int round) {
   constexpr int kShortRounds = 20;
-  constexpr int64_t kShortUs = 50;
-  constexpr int64_t kLongUs = 1000;
-  const bool brief = round < kShortRounds;
-  const int64_t waitedUs =
-      brief ? round * kShortUs : kShortRounds * kShortUs + (round - kShortRounds) * kLongUs;
-  if (waitedUs >= int64_t{*static_cast<const int *>(busyMs)} * 1000) return 0;
-  std::this_thread::sleep_for(std::chrono::microseconds(brief ? kShortUs : kLongUs));
+  constexpr std::chrono::microseconds kShort(50), kLong(1000);
+  Wait &current = *static_cast<Wait *>(wait);
+  const auto now = std::chrono::steady_clock::now();
+  if (round == 0) current.began = now;
+  if (now - current.began >= current.limit) return 0;
+  std::this_thread::sleep_for(round < kShortRounds ? kShort : kLong);
   return 1;
 }
 
-}  // namespace
-
 Database::Database(const std::string &path, Mode mode, int busyMs)
-    : busyMs_(std::make_unique<int>(busyMs)) {
+    : wait_(std::make_unique<Wait>(Wait{std::chrono::milliseconds(busyMs), {}})) {
   int flags = SQLITE_OPEN_NOMUTEX;
   switch (mode) {
     case Mode::kReadOnly:
@@ -65,10 +64,10 @@ Database::Database(const std::string &path, Mode mode, int busyMs)
   const std::string name = mode == Mode::kImmutable ? immutableUri(path) : path;
   sqlite3 *handle = nullptr;
   const int result = sqliteLibrary().open_v2(name.c_str(), &handle, flags, nullptr);
-  handle_.reset(handle);  // SQLite hands out a handle to close even when it could not open
+  handle_.reset(handle);  // must be closed even after a failure
   if (result != SQLITE_OK) fail(result);
   sqliteLibrary().extended_result_codes(handle, 1);
-  sqliteLibrary().busy_handler(handle, waitForOthers, busyMs_.get());
+  sqliteLibrary().busy_handler(handle, waitForOthers, wait_.get());
 }
 
 void Database::execute(const char *sql) {
@@ -77,7 +76,9 @@ void Database::execute(const char *sql) {
 }
 
 void Database::fail(int resultCode) const {
-  if ((resultCode & 0xff) == SQLITE_NOMEM) throw std::bad_alloc();
+  if ((resultCode & 0xff) == SQLITE_NOMEM || resultCode == SQLITE_IOERR_NOMEM) {
+    throw std::bad_alloc();
+  }
   throw SqliteError(resultCode, handle_ ? sqliteLibrary().errmsg(handle_.get())
                                         : sqliteLibrary().errstr(resultCode));
 }
@@ -92,18 +93,18 @@ void Statement::prepare() {
 }
 
 // A reset repeats the error of the last step, which has been thrown already.
-Run::~Run() {
+Query::~Query() {
   (void)sqliteLibrary().reset(statement_);
 }
 
-bool Run::step() {
+bool Query::step() {
   const int result = sqliteLibrary().step(statement_);
   if (result == SQLITE_ROW) return true;
   if (result == SQLITE_DONE) return false;
   database_.fail(result);
 }
 
-std::string Run::text(int column) const {
+std::string Query::text(int column) const {
   // The text first: asking for it may convert the value, and the size is that of the result.
   const unsigned char *bytes = sqliteLibrary().column_text(statement_, column);
   const int size = sqliteLibrary().column_bytes(statement_, column);
@@ -111,43 +112,45 @@ std::string Run::text(int column) const {
   return {reinterpret_cast<const char *>(bytes), static_cast<size_t>(size)};
 }
 
-void Run::bind(int position, int64_t value) {
+void Query::bind(int position, int64_t value) {
   check(sqliteLibrary().bind_int64(statement_, position, value));
 }
 
-void Run::bind(int position, double value) {
+void Query::bind(int position, double value) {
   check(sqliteLibrary().bind_double(statement_, position, value));
 }
 
-void Run::bind(int position, std::string_view text) {
+void Query::bind(int position, std::string_view text) {
   // A null pointer would bind NULL instead of an empty text.
   const char *bytes = text.data() == nullptr ? "" : text.data();
   check(sqliteLibrary().bind_text64(statement_, position, bytes, text.size(), SQLITE_STATIC,
                                     SQLITE_UTF8));
 }
 
-void Run::bind(int position, std::nullptr_t) {
+void Query::bind(int position, std::nullptr_t) {
   check(sqliteLibrary().bind_null(statement_, position));
 }
 
-void Run::check(int resultCode) const {
+void Query::check(int resultCode) const {
   if (resultCode != SQLITE_OK) database_.fail(resultCode);
 }
 
 Transaction::Transaction(TransactionStatements &statements, Kind kind) : statements_(statements) {
-  Run(kind == Kind::kRead ? statements.read : statements.write).finish();
+  (void)statements.rollback.get();
+  (void)statements.commit.get();
+  Query(kind == Kind::kRead ? statements.read : statements.write).finish();
 }
 
 Transaction::~Transaction() {
   if (!open_) return;
-  // Some failures have rolled back already; then there is nothing left to do here.
+  // Some failures have rolled back already.
   if (sqliteLibrary().get_autocommit(statements_.rollback.database().get()) != 0) return;
   (void)sqliteLibrary().step(statements_.rollback.get());
   (void)sqliteLibrary().reset(statements_.rollback.get());
 }
 
 void Transaction::commit() {
-  Run(statements_.commit).finish();
+  Query(statements_.commit).finish();
   open_ = false;
 }
 

@@ -1,10 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// SQLite with owners: a Database, its Statements, one Run of a statement, and a Transaction that is
-// rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
+// SQLite with owners: a Database, its Statements, one Query of a statement, and a Transaction that
+// is rolled back unless it was committed. A failure is a SqliteError with SQLite's own code.
 //
-// Declare a Database before its Statements: they are released before it.
+// Declare a Database before its Statements: they must be released before it.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <stdexcept>
@@ -27,34 +28,41 @@ class SqliteError : public std::runtime_error {
 
 class Database {
  public:
-  // kImmutable reads a file that nobody is writing: without locks, and without the files that
-  // SQLite puts beside a database. Whoever uses it makes sure that the file really did not change.
+  // kImmutable reads a file that no process writes: without locks, and without the files that
+  // SQLite puts beside a database. The caller makes sure that the file does not change.
   enum class Mode { kReadOnly, kReadWrite, kCreate, kImmutable };
 
   // One thread at a time uses a Database and all that belongs to it. busyMs: how long a call waits
-  // for another process before it fails with SQLITE_BUSY.
+  // for another process, by the clock, before it fails with SQLITE_BUSY.
   Database(const std::string &path, Mode mode, int busyMs);
 
-  // Runs texts that answer nothing of use, one or several.
+  // Runs one or several statements whose rows are not needed.
   void execute(const char *sql);
 
   int64_t lastInsertId() const { return sqliteLibrary().last_insert_rowid(handle_.get()); }
   int64_t changedRows() const { return sqliteLibrary().changes(handle_.get()); }
   sqlite3 *get() const { return handle_.get(); }
 
-  // Throws the error that a call on this database has just answered.
+  // Throws the error that a call on this database has just returned.
   [[noreturn]] void fail(int resultCode) const;
 
  private:
   struct Closer {
     void operator()(sqlite3 *handle) const { sqliteLibrary().close(handle); }
   };
-  std::unique_ptr<int> busyMs_;  // SQLite knows where it stands as long as the handle lives
+  // How long the call in progress may wait for another process.
+  struct Wait {
+    std::chrono::milliseconds limit;
+    std::chrono::steady_clock::time_point began;
+  };
+  static int waitForOthers(void *wait, int round);
+
+  std::unique_ptr<Wait> wait_;  // SQLite keeps its address as long as the handle lives
   std::unique_ptr<sqlite3, Closer> handle_;
 };
 
-// A text to be run any number of times. It is prepared when it is first run, so that a program pays
-// only for what it uses.
+// A text to be run any number of times. The first run prepares it, so that a program pays only for
+// what it uses.
 class Statement {
  public:
   Statement(Database &database, std::string sql) : database_(database), sql_(std::move(sql)) {}
@@ -76,19 +84,19 @@ class Statement {
   std::unique_ptr<sqlite3_stmt, Finalizer> handle_;
 };
 
-// One run of a statement, with its arguments; the statement is reset on leaving. Texts and blobs
-// are not copied: they must outlive the run. One run of a statement at a time.
-class Run {
+// One run of a statement, with its arguments; the destructor resets the statement. Texts are not
+// copied: they must outlive the query. A statement has one query at a time.
+class Query {
  public:
   template <typename... Arguments>
-  explicit Run(Statement &statement, const Arguments &...arguments)
+  explicit Query(Statement &statement, const Arguments &...arguments)
       : database_(statement.database()), statement_(statement.get()) {
     int position = 0;
     (bind(++position, arguments), ...);
   }
-  ~Run();
-  Run(const Run &) = delete;
-  Run &operator=(const Run &) = delete;
+  ~Query();
+  Query(const Query &) = delete;
+  Query &operator=(const Query &) = delete;
 
   // Goes to the next row; false when there is none.
   bool step();
@@ -118,7 +126,9 @@ class Run {
   sqlite3_stmt *statement_;
 };
 
-// The texts that begin and end transactions, kept for each database.
+using Run = Query;  // the name that the store's tables still use
+
+// The statements that begin and end transactions, kept for each database.
 class TransactionStatements {
  public:
   explicit TransactionStatements(Database &database)
@@ -134,6 +144,7 @@ class Transaction {
  public:
   enum class Kind { kRead, kWrite };
 
+  // Prepares the rollback before it begins: ending it must not need memory.
   Transaction(TransactionStatements &statements, Kind kind);
   ~Transaction();
   Transaction(const Transaction &) = delete;

@@ -1,20 +1,24 @@
 // SPDX-License-Identifier: Apache-2.0
-// The C functions of the interface. Nothing else in the library is visible from outside, and no
-// exception passes here.
+// The C functions of the interface, and the only symbols that the library exports. No exception
+// leaves them.
 #include <cstdio>
+#include <exception>
 #include <memory>
 #include <new>
 #include <string>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
+#include "knob/last_failure.h"
 #include "knob/live_kernel.h"
-#include "knob/node_ids.h"
+#include "knob/node_list.h"
 #include "knob/node_table.h"
 #include "knob/param_list.h"
 #include "knob/signature.h"
 #include "knob/status.h"
 #include "platform/knob.h"
+#include "platform/knob_status.h"
 
 using Knob::Kernel;
 using Knob::LiveKernel;
@@ -22,25 +26,35 @@ using Knob::Status;
 
 namespace {
 
+// Keeps why the calling thread's call failed, for the text of the status. A failure without a
+// reason forgets the one before.
+KNOB_ReturnStatus failed(KNOB_ReturnStatus status, const char *reason) noexcept {
+  Knob::rememberFailure(status, reason);
+  return status;
+}
+
 // Runs the body of a function; what it throws becomes the status.
 template <typename F>
 KNOB_ReturnStatus guarded(const F &body) noexcept {
   try {
     body();
-    return static_cast<KNOB_ReturnStatus>(Status::kSuccess);
+    return KNOB_STATUS_SUCCESS;
   } catch (const Knob::KernelError &error) {
-    return static_cast<KNOB_ReturnStatus>(error.status);
+    return failed(static_cast<KNOB_ReturnStatus>(error.status), error.what());
   } catch (const std::bad_alloc &) {
-    return static_cast<KNOB_ReturnStatus>(Status::kOutOfMemory);
+    return failed(KNOB_STATUS_OUT_OF_MEMORY, "");
+  } catch (const std::exception &error) {
+    return failed(KNOB_STATUS_FAILURE, error.what());
   } catch (...) {
-    return static_cast<KNOB_ReturnStatus>(Status::kFailure);
+    return failed(KNOB_STATUS_FAILURE, "");
   }
 }
 
 template <typename Value>
 void append(KNOB_ParamList *list, const Value &value) {
   if (list == nullptr || list->entries.size() >= list->capacity) {
-    throw Knob::KernelError(Status::kBadParameter);
+    throw Knob::KernelError(Status::kBadParameter,
+                            list == nullptr ? "no list" : "the list is full");
   }
   list->entries.emplace_back(std::in_place_type<Value>, value);
 }
@@ -58,27 +72,22 @@ extern "C" {
 
 #pragma GCC visibility push(default)
 
-const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo = Knob::kCpuInfoNode;
-const KNOB_NodeID KNOB_NODE_system_vmLimits = Knob::kVmLimitsNode;
-const KNOB_NodeID KNOB_NODE_system_bootCmdLine = Knob::kBootCmdLineNode;
-const KNOB_NodeID KNOB_NODE_memory_comprehensive = Knob::kMemoryNode;
-const KNOB_NodeID KNOB_NODE_sched_groupPathNameToID = Knob::kPathToIdNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_groupCreate = Knob::kGroupCreateNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_delete = Knob::kGroupDeleteNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_memAllocationInMB = Knob::kMemAllocationNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_cpuAllocationInPct = Knob::kCpuAllocationNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_members_groups = Knob::kMemberGroupsNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_members_worlds = Knob::kMemberWorldsNode;
-const KNOB_NodeID KNOB_NODE_sched_groups_stats_memoryStats = Knob::kMemoryStatsNode;
+// A node that knob.h does not declare is an error here: its object would not be exported.
+#define KNOB_EXPORT_NODE(name, number, node)                                    \
+  static_assert(std::is_same_v<decltype(KNOB_NODE_##name), const KNOB_NodeID>); \
+  const KNOB_NodeID KNOB_NODE_##name = number;
+KNOB_NODE_LIST(KNOB_EXPORT_NODE)
+#undef KNOB_EXPORT_NODE
 
 int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
   Knob::BuildSignature running, own;
-  // A kernel that is not usable has no signature to differ in; the calls that follow say so.
+  // A kernel that is not usable has no signature to compare; the calls that follow fail.
   const KNOB_ReturnStatus status = guarded([&] {
     own = Knob::buildSignature();
     running = LiveKernel::instance().with([](Kernel &kernel) { return kernel.signature(); });
   });
-  if (status != 0 || running.md5 == own.md5) return 0;
+  Knob::forgetFailure();  // the result is not a status that has a text
+  if (status != 0 || Knob::sameInterface(running, own)) return 0;
 
   if (runningBuild != nullptr && size > 0) {
     (void)std::snprintf(runningBuild, static_cast<size_t>(size), "%s", running.buildDate.c_str());
@@ -90,9 +99,14 @@ int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild) {
 KNOB_ParamList *KNOB_ParamListCreate(int kind, int capacity) {
   const bool known = kind == static_cast<int>(Knob::ListKind::kInput) ||
                      kind == static_cast<int>(Knob::ListKind::kInstance);
-  if (!known || capacity < 0) return nullptr;
-  return new (std::nothrow)
-      KNOB_ParamList{static_cast<Knob::ListKind>(kind), static_cast<size_t>(capacity), {}};
+  KNOB_ParamList *list = nullptr;
+  if (known && capacity >= 0) {
+    list = new (std::nothrow)
+        KNOB_ParamList{static_cast<Knob::ListKind>(kind), static_cast<size_t>(capacity), {}};
+  }
+  // The caller reports a null list as a status of its own choice, which has no reason.
+  if (list == nullptr) Knob::forgetFailure();
+  return list;
 }
 
 KNOB_ReturnStatus KNOB_ParamListAddInt(KNOB_ParamList *list, int64_t value) {
@@ -101,7 +115,7 @@ KNOB_ReturnStatus KNOB_ParamListAddInt(KNOB_ParamList *list, int64_t value) {
 
 KNOB_ReturnStatus KNOB_ParamListAddString(KNOB_ParamList *list, const char *text) {
   return guarded([&] {
-    if (text == nullptr) throw Knob::KernelError(Status::kBadParameter);
+    if (text == nullptr) throw Knob::KernelError(Status::kBadParameter, "no text");
     append(list, std::string(text));
   });
 }
@@ -141,7 +155,7 @@ KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamLi
 }
 
 const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status) {
-  return Knob::statusText(status);
+  return Knob::explainedStatusText(status);
 }
 
 #pragma GCC visibility pop

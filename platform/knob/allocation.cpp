@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Everything here looks at one allocation alone. Whether the rest of the tree has room for it is
-// the business of admission.
+// Everything here looks at one allocation alone. Admission decides whether the rest of the tree has
+// room for it.
 #include "knob/allocation.h"
 
 #include <array>
-#include <charconv>
-#include <limits>
 #include <string>
+
+#include "common/number.h"
 
 namespace Knob {
 namespace {
@@ -34,23 +34,26 @@ const Setting &settingOf(std::string_view key, std::string_view entry) {
   for (const Setting &setting : kSettings) {
     if (setting.key == key) return setting;
   }
-  refuse(entry, "no setting of that name");
+  refuse(entry, "not a setting (min, max, minLimit, shares)");
 }
 
 int64_t numberOf(Resource resource, std::string_view digits, std::string_view entry) {
-  int64_t number = 0;
-  const char *end = digits.data() + digits.size();
-  const auto [stop, error] = std::from_chars(digits.data(), end, number);
-  if (error != std::errc() || stop != end) refuse(entry, "no decimal number");
-  if (resource == Resource::kCpu && (number < std::numeric_limits<int32_t>::min() ||
-                                     number > std::numeric_limits<int32_t>::max())) {
-    refuse(entry, "number out of range");
+  const auto number = resource == Resource::kCpu
+                          ? std::optional<int64_t>(Platform::parseNumber<int32_t>(digits))
+                          : Platform::parseNumber<int64_t>(digits);
+  if (!number) {
+    refuse(entry, resource == Resource::kCpu ? "not a decimal number of 32 bits"
+                                             : "not a decimal number of 64 bits");
   }
-  return number;
+  return *number;
 }
 
-void check(bool good, const char *why) {
+void check(bool good, const std::string &why) {
   if (!good) throw KernelError(Status::kBadParameter, why);
+}
+
+std::string negative(const char *name, int64_t value) {
+  return name + (" " + std::to_string(value)) + " is negative";
 }
 
 }  // namespace
@@ -76,12 +79,13 @@ Allocation changedAllocation(const Allocation &current, const AllocationChange &
   if (change.minLimit) wanted.minLimit = *change.minLimit;
   if (change.shares) wanted.shares = *change.shares;
 
-  check(wanted.min >= 0, "min is negative");
-  check(wanted.max >= -1, "max is negative");
-  check(wanted.minLimit >= -1, "minLimit is negative");
+  check(wanted.min >= 0, negative("min", wanted.min));
+  check(wanted.max >= -1, negative("max", wanted.max));
+  check(wanted.minLimit >= -1, negative("minLimit", wanted.minLimit));
   check(wanted.shares >= 0 || (wanted.shares >= kHighShares && wanted.shares <= kLowShares),
-        "shares are negative and no level");
-  check(wanted.max == -1 || wanted.min <= wanted.max, "min is above max");
+        "shares " + std::to_string(wanted.shares) + " are neither -2, -3, -4 nor 0 and up");
+  check(wanted.max == -1 || wanted.min <= wanted.max,
+        "min " + std::to_string(wanted.min) + " is above max " + std::to_string(wanted.max));
   return wanted;
 }
 

@@ -28,8 +28,8 @@ std::optional<Configuration> readConfigurationFile(const std::string &fileName) 
   }
   configuration.statePath = file->absolutePath("state");
   configuration.cgroupRoot = file->text("cgroup-root").value_or("");
-  constexpr int64_t kMostVms = std::numeric_limits<uint32_t>::max();
-  if (const auto maxVms = file->integer("max-vms", 0, kMostVms)) {
+  constexpr int64_t kMaxVms = std::numeric_limits<uint32_t>::max();
+  if (const auto maxVms = file->integer("max-vms", 0, kMaxVms)) {
     configuration.maxVms = static_cast<uint32_t>(*maxVms);
   }
   constexpr int64_t kMaxReserve = std::numeric_limits<int32_t>::max();

@@ -29,9 +29,9 @@ bool runsUnderHypervisor() {
 }
 
 std::string bootCommandLine() {
-  constexpr size_t kMostBytes = size_t{64} * 1024;
+  constexpr size_t kMaxBytes = size_t{64} * 1024;
   try {
-    std::string line = Platform::readFile("/proc/cmdline", kMostBytes);
+    std::string line = Platform::readFile("/proc/cmdline", kMaxBytes);
     if (!line.empty() && line.back() == '\n') line.pop_back();
     return line;
   } catch (const std::system_error &) {

@@ -8,7 +8,7 @@
 namespace Knob {
 namespace {
 
-constexpr size_t kLongestName = 255;
+constexpr size_t kMaxNameBytes = 255;
 
 // "cgroup" and every controller of Linux. Any of them can begin a file of a group's directory,
 // whether or not this machine has the controller.
@@ -26,7 +26,7 @@ bool beginsLikeControlFile(std::string_view name) {
 
 bool isGroupName(std::string_view name) {
   constexpr std::string_view kForbidden("/\0\n", 3);
-  if (name.empty() || name.size() > kLongestName) return false;
+  if (name.empty() || name.size() > kMaxNameBytes) return false;
   if (name == "." || name == "..") return false;
   if (name.find_first_of(kForbidden) != std::string_view::npos) return false;
   return !beginsLikeControlFile(name);

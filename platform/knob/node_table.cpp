@@ -1,19 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
-// The table of nodes, and the checks that every row gets alike.
+// What each node does, and the checks that apply to every node.
 #include "knob/node_table.h"
 
 #include <algorithm>
 #include <cstring>
+#include <string>
 
 #include "knob/allocation.h"
-#include "knob/node_ids.h"
 #include "knob/param_list.h"
 #include "platform/knob_records.h"
 
 namespace Knob {
 namespace {
 
-// A caller's buffer may stand at any address.
+// A caller's buffer may have any alignment.
 template <typename Record>
 void write(const NodeCall &call, const Record &record) {
   std::memcpy(call.output, &record, sizeof(record));
@@ -103,38 +103,39 @@ std::vector<int64_t> listMembers(Kernel &kernel, GroupId group) {
   return kernel.members(group);
 }
 
-constexpr InputShape kNoInput = InputShape::kNothing;
+constexpr Node machineNode() {
+  return {};
+}
 
-// id, of a group, get and its size, set with its input and the size of its answer, list
-constexpr std::array<Node, kNodeCount> kNodes = {
-    Node{kCpuInfoNode, false, getCpuInfo, sizeof(KNOB_CpuInfo), nullptr, kNoInput, 0, nullptr},
-    Node{kVmLimitsNode, false, getVmLimits, sizeof(KNOB_VmLimits), nullptr, kNoInput, 0, nullptr},
-    Node{kBootCmdLineNode, false, getBootCommandLine, sizeof(KNOB_BootCommandLine), nullptr,
-         kNoInput, 0, nullptr},
-    Node{kMemoryNode, false, getMemory, sizeof(KNOB_MemoryInfo), nullptr, kNoInput, 0, nullptr},
-    Node{kPathToIdNode, false, nullptr, 0, lookUp, InputShape::kOneText, sizeof(GroupId), nullptr},
-    Node{kGroupCreateNode, true, nullptr, 0, create, InputShape::kOneText, sizeof(GroupId),
-         nullptr},
-    Node{kGroupDeleteNode, true, nullptr, 0, remove, kNoInput, 0, nullptr},
-    Node{kMemAllocationNode, true, getMemoryAllocation, sizeof(KNOB_MemAllocation),
-         setAllocation<Resource::kMemory>, InputShape::kSettings, 0, nullptr},
-    Node{kCpuAllocationNode, true, getCpuAllocation, sizeof(KNOB_CpuAllocation),
-         setAllocation<Resource::kCpu>, InputShape::kSettings, 0, nullptr},
-    Node{kMemberGroupsNode, true, nullptr, 0, nullptr, kNoInput, 0, listGroups},
-    Node{kMemberWorldsNode, true, nullptr, 0, join, InputShape::kOneInt, 0, listMembers},
-    Node{kMemoryStatsNode, true, getMemoryStatistics, sizeof(KNOB_MemoryStats), nullptr, kNoInput,
-         0, nullptr},
-};
+constexpr Node groupNode() {
+  Node node;
+  node.ofGroup = true;
+  return node;
+}
+
+#define KNOB_TABLE_ROW(name, number, node) (node).numbered(number),
+constexpr std::array<Node, kNodeCount> kNodes = {KNOB_NODE_LIST(KNOB_TABLE_ROW)};
+#undef KNOB_TABLE_ROW
+
+constexpr bool hasNumberTwice() {
+  for (size_t i = 0; i < kNodes.size(); ++i) {
+    for (size_t j = 0; j < i; ++j) {
+      if (kNodes[i].id == kNodes[j].id) return true;
+    }
+  }
+  return false;
+}
+static_assert(!hasNumberTwice());
 
 const Node &nodeOf(KNOB_NodeID id) {
   const auto node =
       std::find_if(kNodes.begin(), kNodes.end(), [id](const Node &row) { return row.id == id; });
-  if (node == kNodes.end()) throw KernelError(Status::kBadNode);
+  if (node == kNodes.end()) throw KernelError(Status::kBadNode, "number " + std::to_string(id));
   return *node;
 }
 
 void requireSupport(bool supported) {
-  if (!supported) throw KernelError(Status::kNotSupported);
+  if (!supported) throw KernelError(Status::kNotSupported, "the node has no such call");
 }
 
 GroupId instanceOf(const Node &node, const KNOB_ParamList *instance) {
@@ -145,7 +146,9 @@ GroupId instanceOf(const Node &node, const KNOB_ParamList *instance) {
 
 void requireOutput(const void *output, size_t size, size_t needed) {
   if (needed == 0) return;
-  if (output == nullptr || size < needed) throw KernelError(Status::kBufferSize);
+  if (output == nullptr || size < needed) {
+    throw KernelError(Status::kBufferSize, std::to_string(needed) + " bytes are needed");
+  }
 }
 
 void takeInput(const Node &node, const KNOB_ParamList *input, NodeCall &call) {

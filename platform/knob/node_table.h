@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "knob/kernel.h"
+#include "knob/node_list.h"
 #include "platform/knob.h"
 
 namespace Knob {
@@ -26,23 +27,55 @@ struct NodeCall {
   void *output = nullptr;                  // at least as large as the row says
 };
 
+// What a node does. A row of the list is built from left to right:
+// groupNode().sets(InputShape::kOneInt, join).lists(listMembers).
 struct Node {
   using Function = void (*)(const NodeCall &);
   using ListFunction = std::vector<int64_t> (*)(Kernel &, GroupId);
 
-  KNOB_NodeID id;
-  bool ofGroup;  // whether its instance is [group id], or nothing
-  // What it does; null: the node does not support it.
-  Function get;
-  size_t getSize;
-  Function set;
-  InputShape input;
-  size_t setSize;  // of the answer; 0: there is none
-  ListFunction list;
+  template <typename Record>
+  constexpr Node gets(Function function) const {
+    Node node = *this;
+    node.get = function;
+    node.getSize = sizeof(Record);
+    return node;
+  }
+  constexpr Node sets(InputShape shape, Function function) const {
+    Node node = *this;
+    node.set = function;
+    node.input = shape;
+    return node;
+  }
+  // What a set writes into the caller's output.
+  template <typename Output>
+  constexpr Node returns() const {
+    Node node = *this;
+    node.setSize = sizeof(Output);
+    return node;
+  }
+  constexpr Node lists(ListFunction function) const {
+    Node node = *this;
+    node.list = function;
+    return node;
+  }
+  constexpr Node numbered(KNOB_NodeID number) const {
+    Node node = *this;
+    node.id = number;
+    return node;
+  }
+
+  KNOB_NodeID id = 0;
+  bool ofGroup = false;  // its instance is [group id]; otherwise it has none
+  // A null function: the node does not support the call.
+  Function get = nullptr;
+  size_t getSize = 0;
+  Function set = nullptr;
+  InputShape input = InputShape::kNothing;
+  size_t setSize = 0;  // 0: a set has no output
+  ListFunction list = nullptr;
 };
 
-// All nodes.
-inline constexpr size_t kNodeCount = 12;
+// All nodes, in the order of the list.
 const std::array<Node, kNodeCount> &nodeTable();
 
 // The calls. They throw KernelError: bad node, not supported, bad parameter, buffer size, and what

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Every way in which a list can be wrong is found here, before a kernel sees anything of the call.
+// Every wrong list is refused here, before a kernel sees the call.
 #include "knob/param_list.h"
 
 #include "knob/kernel.h"
@@ -13,12 +13,13 @@ void check(bool good, const char *why) {
 
 const KNOB_ParamList &listOf(const KNOB_ParamList *list, ListKind kind) {
   check(list != nullptr, "a list is missing");
-  check(list->kind == kind, "a list of the wrong kind");
+  check(list->kind == kind, "a list is of the wrong kind");
   return *list;
 }
 
 void requireNothing(const KNOB_ParamList *list, ListKind kind) {
-  if (list != nullptr) check(listOf(list, kind).entries.empty(), "a list that is not expected");
+  if (list != nullptr)
+    check(listOf(list, kind).entries.empty(), "a list has entries where none are expected");
 }
 
 const ListEntry &onlyEntry(const KNOB_ParamList *list, ListKind kind) {

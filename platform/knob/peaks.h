@@ -12,9 +12,9 @@ namespace Knob {
 
 // Saturates: an amount that KB cannot express is the most that they can.
 constexpr uint64_t kilobytes(int64_t megabytes) {
-  constexpr uint64_t kMost = std::numeric_limits<uint64_t>::max();
+  constexpr uint64_t kMax = std::numeric_limits<uint64_t>::max();
   const auto amount = static_cast<uint64_t>(megabytes);
-  return amount > kMost / 1024 ? kMost : amount * 1024;
+  return amount > kMax / 1024 ? kMax : amount * 1024;
 }
 
 // Raises the peaks to what is reserved now.

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Looks texts up; the texts themselves stand in the header's table.
+// Finds the text of a status; the texts themselves are in the header's table.
 #include "knob/status.h"
 
 #include <cstdio>
@@ -13,6 +13,11 @@ const char *statusText(uint32_t status) noexcept {
   thread_local std::array<char, 32> unknown;
   (void)std::snprintf(unknown.data(), unknown.size(), "unknown status 0x%08X", status);
   return unknown.data();
+}
+
+std::string_view statusName(uint32_t status) noexcept {
+  const std::string_view text = statusText(status);
+  return text.substr(0, text.find(": "));
 }
 
 }  // namespace Knob

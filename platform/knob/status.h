@@ -4,6 +4,7 @@
 
 #include <array>
 #include <cstdint>
+#include <string_view>
 
 #include "platform/knob_status.h"
 
@@ -26,6 +27,7 @@ enum class Status : uint32_t {
   kKernelNotUsable = KNOB_STATUS_KERNEL_NOT_USABLE,
 };
 
+// The part behind ": " is the usual reason; where the reason of a failure is known, it replaces it.
 struct StatusText {
   Status status;
   const char *text;
@@ -47,11 +49,14 @@ inline constexpr std::array kStatusTexts = {
     StatusText{
         Status::kReservationRefused,
         "reservation refused: more than the group, one above it or the machine has room for"},
-    StatusText{Status::kKernelNotUsable, "kernel not usable (`knobctl status` tells why)"},
+    StatusText{Status::kKernelNotUsable, "kernel not usable (see `knobctl status`)"},
 };
 
-// The text of a status. One that the table does not have gets a text with its number, which lasts
-// until the calling thread asks for another.
+// The text of a status. For a status that is not in the table, a text with its number, valid until
+// the calling thread asks for another.
 const char *statusText(uint32_t status) noexcept;
+
+// The text without the usual reason: "busy". Valid as long as the text.
+std::string_view statusName(uint32_t status) noexcept;
 
 }  // namespace Knob

@@ -3,7 +3,8 @@
    the kernel's text for a status.
 
    Rules that hold for every function:
-   1. A KNOB_ReturnStatus of 0 is success; every other value is a failure and nothing has changed.
+   1. A KNOB_ReturnStatus of 0 is success; every other value is a failure, and nothing has changed.
+      knob_status.h names the values.
    2. Lists given to a call stay the caller's; a list handed out belongs to the caller, who
       destroys it with KNOB_ParamListDestroy.
    3. Texts are NUL-terminated bytes. A text that is added to a list is copied.
@@ -29,8 +30,8 @@ typedef struct KNOB_ParamList KNOB_ParamList;
    kernel's build date, cut to fit, and *myBuild the library's own, which is never freed. */
 int KNOB_CheckSig(char *runningBuild, int size, const char **myBuild);
 
-/* Makes an empty list. kind: 0 for input arguments, 1 for instance arguments. capacity: the most
-   entries that it will take, 0 or more. Null: no memory, an unknown kind or a negative capacity. */
+/* Makes an empty list. kind: 0 for input arguments, 1 for instance arguments. capacity: how many
+   entries it takes, 0 or more. Null: no memory, an unknown kind or a negative capacity. */
 KNOB_ParamList *KNOB_ParamListCreate(int kind, int capacity);
 
 /* Appends one entry. A null or a full list, or a null text, is a bad parameter and nothing is
@@ -51,8 +52,8 @@ KNOB_ReturnStatus KNOB_Get(KNOB_NodeID node, const KNOB_ParamList *instance, voi
                            size_t outputSize);
 
 /* Sets NODE. instance: the list [group id], or null where the node has no instance. input: the
-   arguments, or null where it takes none. output: where the node answers, or null and 0. Returns 0
-   or a status; a change is made whole or not at all. */
+   arguments, or null where it takes none. output: receives the node's result, or null and 0.
+   Returns 0 or a status; a change is made whole or not at all. */
 KNOB_ReturnStatus KNOB_Set(KNOB_NodeID node, const KNOB_ParamList *instance,
                            const KNOB_ParamList *input, void *output, size_t outputSize);
 
@@ -61,11 +62,12 @@ KNOB_ReturnStatus KNOB_Set(KNOB_NodeID node, const KNOB_ParamList *instance,
 KNOB_ReturnStatus KNOB_GetInstanceListAlloc(KNOB_NodeID node, const KNOB_ParamList *instance,
                                             KNOB_ParamList **result);
 
-/* A short text for a status; one for unknown statuses too, with the number in it. The text is
-   valid until the calling thread asks for another one. */
+/* A text for a status, in one line. For the status of the calling thread's last failed call the
+   reason follows, as in "not found: host/opt/no". An unknown status has a text with its number.
+   The text is valid until the thread asks for another one or makes another call. */
 const char *NUC_ReturnStatusToString(KNOB_ReturnStatus status);
 
-/* Facts of the machine (get, no instance). */
+/* Facts of the machine (get, no instance). knob_records.h has the records. */
 extern const KNOB_NodeID KNOB_NODE_hardware_cpu_cpuInfo; /* 38 bytes */
 extern const KNOB_NodeID KNOB_NODE_system_vmLimits;      /* 32 bytes */
 extern const KNOB_NodeID KNOB_NODE_system_bootCmdLine;   /* 4096 bytes, NUL-terminated */

@@ -64,8 +64,8 @@ typedef struct KNOB_MemoryStats {
 
 #pragma pack(pop)
 
-#ifdef __cplusplus /* C99 has no static_assert; libknob, which is C++, checks the layout for all \
-                    */
+/* libknob checks the layout for programs in C99, which has no static_assert. */
+#ifdef __cplusplus
 
 static_assert(sizeof(KNOB_CpuInfo) == 38);
 static_assert(offsetof(KNOB_CpuInfo, reserved0) == 0);

@@ -5,6 +5,7 @@
 #include <cstdlib>
 
 #include "kernel_under_test.h"
+#include "knob/emulated/boot.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "temp_folder.h"
 

@@ -2,70 +2,15 @@
 // What the CPU settings are worth, by the kernel's own account of the time that each group used.
 #include <gtest/gtest.h>
 
-#include <chrono>
-#include <memory>
-#include <thread>
+#include <string>
 #include <vector>
 
-#include "linux_world.h"
+#include "cpu_world.h"
 
 namespace Uml {
 namespace {
 
-using Clock = std::chrono::steady_clock;
-
-// What share of the time that passes a group uses, in percent of one CPU.
-class Meter {
- public:
-  explicit Meter(const std::string &group)
-      : group_(group), used_(usedNow()), since_(Clock::now()) {}
-
-  double percent() const {
-    const std::chrono::duration<double, std::micro> passed = Clock::now() - since_;
-    return 100.0 * static_cast<double>(usedNow() - used_) / passed.count();
-  }
-
- private:
-  int64_t usedNow() const { return numberIn(group_, "cpu.stat", "usage_usec"); }
-
-  std::string group_;
-  int64_t used_;
-  Clock::time_point since_;
-};
-
-// Long enough for 60 of the kernel's periods, over which it keeps its promises.
-void measure() {
-  std::this_thread::sleep_for(std::chrono::seconds(6));
-}
-
-// What the groups used of the time that passed in all of them, in percent.
-std::vector<double> partsOf(const std::vector<std::string> &groups) {
-  std::vector<Meter> meters;
-  for (const std::string &group : groups) meters.emplace_back(group);
-  measure();
-  std::vector<double> parts;
-  double sum = 0;
-  for (const Meter &meter : meters) sum += parts.emplace_back(meter.percent());
-  for (double &part : parts) part *= 100 / sum;
-  return parts;
-}
-
-class Cpu : public LinuxTest {
- protected:
-  // A group of another program beside host.
-  static void makeSlice(const std::string &name, int weight) {
-    std::filesystem::create_directory(kMount / name);
-    writeControl("", "cgroup.subtree_control", "+memory +cpu");
-    writeControl(name, "cpu.weight", std::to_string(weight));
-  }
-
-  void addBusyProcess(const std::string &group) {
-    workers_.push_back(std::make_unique<Worker>(group, beBusy));
-  }
-
- private:
-  std::vector<std::unique_ptr<Worker>> workers_;
-};
+class Cpu : public CpuTest {};
 
 TEST_F(Cpu, AMinimumOf75LeavesItsPoolAtLeast70PercentBesideABusyNeighbour) {
   ASSERT_TRUE(silentlyDone(load("- name: first\n  cpuMin: 75\n- name: other\n")));

@@ -92,7 +92,7 @@ TEST_F(ExecInPool, WithoutTheRightToMoveProcessesItSaysSo) {
       world.run("/usr/bin/setpriv",
                 {"--bounding-set=-all", "--inh-caps=-all", "poolctl-exec", "web", "--", "true"});
   EXPECT_EQ(result.status, 125);
-  EXPECT_EQ(result.err, "poolctl-exec: host/opt/web: permission denied\n");
+  EXPECT_EQ(result.err.rfind("poolctl-exec: host/opt/web: permission denied", 0), 0U) << result.err;
 }
 
 TEST_F(ExecInPool, AHostWithoutControlGroupsIsNotUsable) {
@@ -100,8 +100,12 @@ TEST_F(ExecInPool, AHostWithoutControlGroupsIsNotUsable) {
       "/usr/bin/unshare",
       {"--mount", "/bin/sh", "-c", "umount /sys/fs/cgroup; exec poolctl-exec web -- true"});
   EXPECT_EQ(result.status, 125);
-  EXPECT_EQ(result.err,
-            "poolctl-exec: host/opt/web: kernel not usable (`knobctl status` tells why)\n");
+  EXPECT_EQ(
+      result.err.rfind("poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`): "
+                       "no cgroup2 file system is mounted",
+                       0),
+      0U)
+      << result.err;
 }
 
 }  // namespace

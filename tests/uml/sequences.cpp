@@ -15,7 +15,7 @@
 #include <sstream>
 
 #include "knob/allocation.h"
-#include "knob/emulated/emulated_kernel.h"
+#include "knob/emulated/boot.h"
 #include "knob/session.h"
 
 namespace {

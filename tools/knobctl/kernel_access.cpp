@@ -21,19 +21,27 @@ Tools::ExitStatus exitStatus(Knob::Status status) {
   }
 }
 
-// The status's own text sends people to knobctl; here the reason itself is at hand.
-std::string statusWords(Knob::Status status) {
-  if (status == Knob::Status::kKernelNotUsable) return "kernel not usable";
-  return Knob::statusText(static_cast<uint32_t>(status));
+bool endsWith(const std::string &text, const std::string &end) {
+  return text.size() >= end.size() && text.compare(text.size() - end.size(), end.size(), end) == 0;
+}
+
+// What went wrong, without a reason that WHAT has said: "stats host/a: not found" needs no second
+// host/a.
+std::string explained(const std::string &what, const Knob::KernelError &error) {
+  const auto status = static_cast<uint32_t>(error.status);
+  const std::string reason = error.what();
+  if (reason.empty()) return Knob::statusText(status);
+  // The status's name refers people to knobctl, which this is.
+  const std::string name = error.status == Knob::Status::kKernelNotUsable
+                               ? "kernel not usable"
+                               : std::string(Knob::statusName(status));
+  return endsWith(what, reason) ? name : name + ": " + Tools::printable(reason);
 }
 
 }  // namespace
 
 Tools::Failure failure(const std::string &what, const Knob::KernelError &error) {
-  std::string text = Tools::printable(what) + ": " + statusWords(error.status);
-  const std::string detail = error.what();
-  if (!detail.empty()) text += ": " + Tools::printable(detail);
-  return {exitStatus(error.status), text};
+  return {exitStatus(error.status), Tools::printable(what) + ": " + explained(what, error)};
 }
 
 }  // namespace Knobctl

@@ -7,11 +7,11 @@
 #include <string>
 #include <string_view>
 
+#include "common/printable.h"
+
 namespace Tools {
 
-// The text with control characters, backslashes and bytes that are not UTF-8 escaped: "\t", "\n",
-// "\\", and "\xHH" for each other byte. Two different texts never become equal.
-std::string printable(std::string_view text);
+using Platform::printable;
 
 // How many columns a text takes on a terminal: one for each character, two for the wide ones of
 // East Asia and for emoji, none for combining marks.

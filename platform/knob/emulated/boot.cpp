@@ -1,10 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
-// Starts the emulated kernel: the first use does it with this machine's facts, knobctl with others.
+// Collects the facts of a boot and writes them into a new state or over the old one.
+#include "knob/emulated/boot.h"
+
 #include <ctime>
 
 #include "knob/emulated/boot_record.h"
-#include "knob/emulated/emulated_kernel.h"
-#include "knob/emulated/first_use.h"
 #include "knob/emulated/schema.h"
 #include "knob/emulated/state_file.h"
 #include "knob/machine_facts.h"
@@ -14,16 +14,16 @@ namespace Knob {
 namespace {
 
 using Platform::Database;
-using Platform::Run;
+using Platform::Query;
 using Platform::Statement;
 
-constexpr size_t kLongestCommandLine = 4095;
+constexpr size_t kMaxCommandLineBytes = 4095;
 
 HostFacts factsToBootWith(const BootFacts &wanted) {
-  constexpr uint64_t kMostMB = UINT64_MAX / 1024;
+  constexpr uint64_t kMaxMB = UINT64_MAX / 1024;
   HostFacts facts = readMachineFacts();
   if (wanted.cpus) facts.cpus = *wanted.cpus;
-  if (wanted.memoryMB && *wanted.memoryMB > kMostMB) {
+  if (wanted.memoryMB && *wanted.memoryMB > kMaxMB) {
     throw KernelError(Status::kBadParameter, "more memory than can be counted in KB");
   }
   if (wanted.memoryMB) facts.memoryKB = *wanted.memoryMB * 1024;
@@ -32,11 +32,11 @@ HostFacts factsToBootWith(const BootFacts &wanted) {
 
   if (facts.cpus == 0) throw KernelError(Status::kBadParameter, "a machine has at least one CPU");
   if (facts.memoryKB == 0) throw KernelError(Status::kBadParameter, "a machine has some memory");
-  if (facts.bootCommandLine.size() > kLongestCommandLine) {
+  if (facts.bootCommandLine.size() > kMaxCommandLineBytes) {
     if (wanted.commandLine) {
       throw KernelError(Status::kBadParameter, "a command line has at most 4095 bytes");
     }
-    facts.bootCommandLine.resize(kLongestCommandLine);
+    facts.bootCommandLine.resize(kMaxCommandLineBytes);
   }
   return facts;
 }
@@ -53,19 +53,19 @@ void writeBoot(Database &database, const BootRecord &record) {
                    "build_date) VALUES (1, ?, ?, ?, ?, ?, ?, ?)");
   const HostFacts &facts = record.facts;
   // KB of 2^63 and more are kept as negative numbers and read back as what they were.
-  Run(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
-      facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
+  Query(insert, kStateVersion, int64_t{facts.cpus}, static_cast<int64_t>(facts.memoryKB),
+        facts.isVm ? 1 : 0, facts.bootCommandLine, record.signature.md5, record.signature.buildDate)
       .finish();
   if (!record.maxVms) return;
   Statement setMaxVms(database, "UPDATE kernel SET max_vms = ?");
-  Run(setMaxVms, int64_t{*record.maxVms}).finish();
+  Query(setMaxVms, int64_t{*record.maxVms}).finish();
 }
 
 void refuseWhileGroupsExist(Database &database) {
   Statement statement(database, "SELECT COUNT(*) FROM groups WHERE id NOT IN (?, ?)");
-  Run run(statement, kHostId, kOptId);
-  if (run.step() && run.integer(0) > 0) {
-    throw KernelError(Status::kBusy, "the kernel has " + std::to_string(run.integer(0)) +
+  Query query(statement, kHostId, kOptId);
+  if (query.step() && query.integer(0) > 0) {
+    throw KernelError(Status::kBusy, "the kernel has " + std::to_string(query.integer(0)) +
                                          " groups; only force ends them");
   }
 }
@@ -81,11 +81,11 @@ void rebootState(const std::string &path, const BootRecord &record, bool force) 
   writeBootRecord(path, record);
 }
 
-// Ids that nobody can hold: those of the state that is lost are unknown, but they did not come
+// Ids that no process knows: those of the lost state are unknown, but they did not come
 // faster than a thousand in a second.
 void skipLostIds(Database &database) {
   Statement statement(database, "UPDATE sqlite_sequence SET seq = ? WHERE name = 'groups'");
-  Run(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
+  Query(statement, static_cast<int64_t>(std::time(nullptr)) * 1000).finish();
 }
 
 void makeState(const BootLock &lock, const std::string &path, const BootRecord &record,

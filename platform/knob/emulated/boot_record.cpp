@@ -7,20 +7,20 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <array>
-#include <charconv>
 #include <cstdio>
 #include <string_view>
 #include <system_error>
 
+#include "common/number.h"
 #include "common/read_file.h"
 #include "common/unique_fd.h"
+#include "common/write_all.h"
 
 namespace Knob {
 namespace {
 
 constexpr std::string_view kForm = "knob boot record 1";
-constexpr size_t kMostBytes = 8192;
+constexpr size_t kMaxBytes = 8192;
 
 std::string recordPath(const std::string &statePath) {
   return statePath + "-facts";
@@ -42,9 +42,9 @@ std::string_view takeLine(std::string_view &text) {
 
 template <typename Number>
 bool takeNumber(std::string_view &text, Number &number) {
-  const std::string_view line = takeLine(text);
-  const auto [stop, error] = std::from_chars(line.data(), line.data() + line.size(), number);
-  return error == std::errc() && stop == line.data() + line.size();
+  const auto value = Platform::parseNumber<Number>(takeLine(text));
+  if (value) number = *value;
+  return value.has_value();
 }
 
 std::optional<BootRecord> parse(std::string_view text, std::string_view identity) {
@@ -76,13 +76,12 @@ std::string written(const BootRecord &record, const std::string &identity) {
   return text + record.facts.bootCommandLine;
 }
 
-bool writeWhole(const std::string &path, std::string_view content) {
+bool writeNewFile(const std::string &path, std::string_view content) {
   constexpr mode_t kForAllToRead = 0644;
-  (void)::unlink(path.c_str());  // of a boot that was killed; and nothing that leads elsewhere
+  (void)::unlink(path.c_str());  // left by a boot that was killed, or a link to another file
   const Platform::UniqueFd fd(
       ::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kForAllToRead));
-  return fd &&
-         ::write(fd.get(), content.data(), content.size()) == static_cast<ssize_t>(content.size());
+  return fd && Platform::writeAll(fd.get(), content) == 0;
 }
 
 }  // namespace
@@ -91,7 +90,7 @@ std::optional<BootRecord> readBootRecord(const std::string &statePath) {
   const std::string identity = identityOf(statePath);
   if (identity.empty()) return std::nullopt;
   try {
-    return parse(Platform::readFile(recordPath(statePath), kMostBytes), identity);
+    return parse(Platform::readFile(recordPath(statePath), kMaxBytes), identity);
   } catch (const std::system_error &) {
     return std::nullopt;
   }
@@ -105,7 +104,7 @@ void writeBootRecord(const std::string &statePath, const BootRecord &record) {
   const std::string path = recordPath(statePath);
   const std::string beside = path + ".new";
   const std::string identity = identityOf(statePath);
-  if (!writeWhole(beside, written(record, identity)) ||
+  if (!writeNewFile(beside, written(record, identity)) ||
       ::rename(beside.c_str(), path.c_str()) != 0) {
     (void)::unlink(beside.c_str());
   }

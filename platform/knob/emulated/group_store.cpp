@@ -5,12 +5,12 @@
 namespace Knob {
 namespace {
 
-using Platform::Run;
+using Platform::Query;
 using Platform::Statement;
 
-std::vector<Member> membersIn(Run &run) {
+std::vector<Member> membersIn(Query &query) {
   std::vector<Member> members;
-  while (run.step()) members.push_back({run.integer(0), run.integer(1), run.integer(2)});
+  while (query.step()) members.push_back({query.integer(0), query.integer(1), query.integer(2)});
   return members;
 }
 
@@ -45,106 +45,106 @@ GroupStore::GroupStore(Platform::Database &database)
       signature_(database, "SELECT md5, build_date FROM kernel") {}
 
 std::optional<GroupId> GroupStore::child(GroupId parent, std::string_view name) {
-  Run run(child_, parent, name);
-  if (!run.step()) return std::nullopt;
-  return run.integer(0);
+  Query query(child_, parent, name);
+  if (!query.step()) return std::nullopt;
+  return query.integer(0);
 }
 
 bool GroupStore::exists(GroupId id) {
-  return Run(exists_, id).step();
+  return Query(exists_, id).step();
 }
 
 bool GroupStore::hasChildren(GroupId id) {
-  return Run(children_, id).step();
+  return Query(children_, id).step();
 }
 
 std::vector<GroupId> GroupStore::children(GroupId id) {
   std::vector<GroupId> ids;
-  Run run(children_, id);
-  while (run.step()) ids.push_back(run.integer(0));
+  Query query(children_, id);
+  while (query.step()) ids.push_back(query.integer(0));
   return ids;
 }
 
 GroupId GroupStore::parentOf(GroupId id) {
-  Run run(identity_, id);
-  return run.step() ? run.integer(0) : 0;
+  Query query(identity_, id);
+  return query.step() ? query.integer(0) : 0;
 }
 
 std::string GroupStore::nameOf(GroupId id) {
-  Run run(identity_, id);
-  return run.step() ? run.text(1) : std::string();
+  Query query(identity_, id);
+  return query.step() ? query.text(1) : std::string();
 }
 
 GroupId GroupStore::add(GroupId parent, std::string_view name) {
-  Run(add_, parent, name).finish();
+  Query(add_, parent, name).finish();
   return database_.lastInsertId();
 }
 
 void GroupStore::remove(GroupId id) {
-  Run(remove_, id).finish();
+  Query(remove_, id).finish();
 }
 
 std::optional<ResourceRow> GroupStore::read(GroupId id, Resource resource) {
-  Run run(of(resource).read, id);
-  if (!run.step()) return std::nullopt;
+  Query query(of(resource).read, id);
+  if (!query.step()) return std::nullopt;
   ResourceRow row;
-  row.parent = run.integer(0);
-  row.state.allocation = {run.integer(1), run.integer(2), run.integer(3), run.integer(4)};
-  row.state.childrenSum = run.integer(5);
-  row.peaks = {static_cast<uint64_t>(run.integer(6)), static_cast<uint64_t>(run.integer(7))};
+  row.parent = query.integer(0);
+  row.state.allocation = {query.integer(1), query.integer(2), query.integer(3), query.integer(4)};
+  row.state.childrenSum = query.integer(5);
+  row.peaks = {static_cast<uint64_t>(query.integer(6)), static_cast<uint64_t>(query.integer(7))};
   return row;
 }
 
 void GroupStore::writeAllocation(GroupId id, Resource resource, const Allocation &allocation) {
-  Run(of(resource).writeAllocation, allocation.min, allocation.max, allocation.minLimit,
-      allocation.shares, id)
+  Query(of(resource).writeAllocation, allocation.min, allocation.max, allocation.minLimit,
+        allocation.shares, id)
       .finish();
 }
 
 void GroupStore::writeChildrenSum(GroupId id, Resource resource, int64_t sum) {
-  Run(of(resource).writeChildrenSum, sum, id).finish();
+  Query(of(resource).writeChildrenSum, sum, id).finish();
 }
 
 void GroupStore::writePeaks(GroupId id, const MemoryStatistics &peaks) {
-  Run(writePeaks_, static_cast<int64_t>(peaks.ownReservedPeakKB),
-      static_cast<int64_t>(peaks.childrenReservedPeakKB), id)
+  Query(writePeaks_, static_cast<int64_t>(peaks.ownReservedPeakKB),
+        static_cast<int64_t>(peaks.childrenReservedPeakKB), id)
       .finish();
 }
 
 std::vector<Member> GroupStore::membersOf(GroupId id) {
-  Run run(membersOf_, id);
-  return membersIn(run);
+  Query query(membersOf_, id);
+  return membersIn(query);
 }
 
 std::vector<Member> GroupStore::allMembers() {
-  Run run(allMembers_);
-  return membersIn(run);
+  Query query(allMembers_);
+  return membersIn(query);
 }
 
 void GroupStore::putMember(const Member &member) {
-  Run(putMember_, member.pid, member.started, member.group).finish();
+  Query(putMember_, member.pid, member.started, member.group).finish();
 }
 
 void GroupStore::removeMember(int64_t pid) {
-  Run(removeMember_, pid).finish();
+  Query(removeMember_, pid).finish();
 }
 
 HostFacts GroupStore::facts(uint32_t defaultMaxVms) {
   HostFacts facts;
-  Run run(facts_);
-  if (!run.step()) throw KernelError(Status::kKernelNotUsable, "the state has no facts");
-  facts.cpus = static_cast<uint32_t>(run.integer(0));
-  facts.memoryKB = static_cast<uint64_t>(run.integer(1));
-  facts.maxVms = run.isNull(2) ? defaultMaxVms : static_cast<uint32_t>(run.integer(2));
-  facts.isVm = run.integer(3) != 0;
-  facts.bootCommandLine = run.text(4);
+  Query query(facts_);
+  if (!query.step()) throw KernelError(Status::kKernelNotUsable, "the state has no facts");
+  facts.cpus = static_cast<uint32_t>(query.integer(0));
+  facts.memoryKB = static_cast<uint64_t>(query.integer(1));
+  facts.maxVms = query.isNull(2) ? defaultMaxVms : static_cast<uint32_t>(query.integer(2));
+  facts.isVm = query.integer(3) != 0;
+  facts.bootCommandLine = query.text(4);
   return facts;
 }
 
 BuildSignature GroupStore::signature() {
-  Run run(signature_);
-  if (!run.step()) throw KernelError(Status::kKernelNotUsable, "the state has no signature");
-  return {run.text(0), run.text(1)};
+  Query query(signature_);
+  if (!query.step()) throw KernelError(Status::kKernelNotUsable, "the state has no signature");
+  return {query.text(0), query.text(1)};
 }
 
 }  // namespace Knob

@@ -129,4 +129,13 @@ void writeRecord(int directory, const Record &record) {
   writeAttribute(directory, kRecordAttribute, {bytes.data(), bytes.size()});
 }
 
+void writeFirstRecord(int directory) {
+  const RecordBytes bytes = encode(Record());
+  try {
+    writeAttribute(directory, kRecordAttribute, {bytes.data(), bytes.size()}, Attribute::kNew);
+  } catch (const KernelError &error) {
+    if (error.status != Status::kExists) throw;
+  }
+}
+
 }  // namespace Knob::Linux

@@ -137,10 +137,12 @@ TEST_F(Exec, PoolBelowADisabledOneRunsNothing) {
       "poolctl-exec: host/opt/parent/below: disabled: host/opt/parent has no memory\n");
 }
 
-TEST_F(Exec, UnusableKernelIsReported) {
+TEST_F(Exec, AKernelThatIsNotUsableIsReportedWithTheReason) {
   writeFile(world.folder() / "knob.conf", "kernel = none\n");
   expectOwnFailure({"web", "--", "true"},
-                   "poolctl-exec: host/opt/web: kernel not usable (`knobctl status` tells why)\n");
+                   "poolctl-exec: host/opt/web: kernel not usable (see `knobctl status`): " +
+                       (world.folder() / "knob.conf").string() +
+                       ":1: kernel: bad value \"none\" (one of: emulated, linux)\n");
 }
 
 TEST_F(Exec, WrongUsageExitsWith125) {

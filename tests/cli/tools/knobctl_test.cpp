@@ -88,6 +88,13 @@ class Knobctl : public testing::Test {
     own->setAllocation(own->lookUp(path), resource, change);
   }
 
+  // Changes the state without the kernel, and without the copy of its facts.
+  void changeState(const char *sql) const {
+    Platform::Database(world_.folder() / "kernel.db", Platform::Database::Mode::kReadWrite, 1000)
+        .execute(sql);
+    fs::remove(world_.folder() / "kernel.db-facts");
+  }
+
   World world_;
 };
 
@@ -110,7 +117,8 @@ TEST_F(Knobctl, GroupsAreMadeAndDeleted) {
 
 TEST_F(Knobctl, WhatIsNotThereIsStatus3) {
   EXPECT_EQ(err(3, {"delete", "host/none"}), "knobctl: delete host/none: not found\n");
-  EXPECT_EQ(err(3, {"create", "host/none/a"}), "knobctl: create host/none/a: not found\n");
+  EXPECT_EQ(err(3, {"create", "host/none/a"}),
+            "knobctl: create host/none/a: not found: host/none\n");
   EXPECT_EQ(err(3, {"tree", "host/none"}), "knobctl: tree host/none: not found\n");
   EXPECT_EQ(err(3, {"tree", ""}), "knobctl: tree : not found\n");
   EXPECT_THAT(err(3, {"join", "host/opt", "4194305"}),
@@ -164,6 +172,54 @@ TEST_F(Knobctl, StatsPrintsAllThatIsKnownOfAGroup) {
                                                       "CPU shares                77\n"
                                                       "CPU reservation %         50\n"));
   EXPECT_THAT(out({"stats", "host"}), HasSubstr("memory children peak KB   524288\n"));
+}
+
+TEST_F(Knobctl, SetChangesWhatIsGivenAndNothingElse) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-min", "512", "--mem-max", "1024", "--mem-min-limit",
+                 "600", "--mem-shares", "high", "--cpu-min", "50", "--cpu-max", "150",
+                 "--cpu-min-limit", "60", "--cpu-shares", "77"}),
+            "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-max", "none", "--cpu-min", "0"}), "");
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             512\n"
+                                                      "memory max MB             none\n"
+                                                      "memory minLimit MB        600\n"
+                                                      "memory shares             high\n"));
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("CPU min %                 0\n"
+                                                      "CPU max %                 150\n"
+                                                      "CPU minLimit %            60\n"
+                                                      "CPU shares                77\n"));
+}
+
+TEST_F(Knobctl, SetReportsWhyItIsRefusedAndChangesNothing) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(err(1, {"set", "host/opt/a", "--mem-min", "300", "--mem-max", "200"}),
+            "knobctl: set host/opt/a: memory: bad parameter: min 300 is above max 200\n");
+  EXPECT_THAT(err(1, {"set", "host/opt/a", "--mem-min", "8193"}),
+              StartsWith("knobctl: set host/opt/a: memory: reservation refused"));
+  EXPECT_EQ(err(3, {"set", "host/opt/b", "--mem-min", "1"}),
+            "knobctl: set host/opt/b: not found\n");
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             0\n"));
+}
+
+TEST_F(Knobctl, SetPutsTheMemoryBackWhenTheCpuIsRefused) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-min", "5", "--mem-max", "64"}), "");
+  EXPECT_THAT(err(1, {"set", "host/opt/a", "--mem-min", "7", "--cpu-min", "401"}),
+              StartsWith("knobctl: set host/opt/a: CPU: reservation refused"));
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             5\n"
+                                                      "memory max MB             64\n"));
+}
+
+TEST_F(Knobctl, SetRefusesValuesThatAreNotAmounts) {
+  EXPECT_THAT(err(2, {"set", "host/opt"}), HasSubstr("no setting is given"));
+  for (const char *value : {"-1", "x", "", "1.5", "none", "9223372036854775808"}) {
+    EXPECT_THAT(err(2, {"set", "host/opt", "--mem-min", value}),
+                HasSubstr("is not a number from 0 up"))
+        << value;
+  }
+  EXPECT_THAT(err(2, {"set", "host/opt", "--cpu-shares", "huge"}),
+              HasSubstr("\"huge\" is not low, normal, high or a number from 0 up"));
 }
 
 TEST_F(Knobctl, TreeAlignsGroupsAndDrawsThemAgainstTheMachine) {
@@ -301,21 +357,26 @@ TEST_F(Knobctl, StatusTellsOfADamagedState) {
   EXPECT_THAT(out({"status"}), HasSubstr("usable"));
 }
 
-TEST_F(Knobctl, StatusTellsOfAKernelOfAnotherBuild) {
-  Platform::Database(world_.folder() / "kernel.db", Platform::Database::Mode::kReadWrite, 1000)
-      .execute("UPDATE kernel SET md5 = 'another'");
+TEST_F(Knobctl, StatusRefusesAKernelOfAnotherInterface) {
+  changeState("UPDATE kernel SET md5 = 'another'");
   const ProcessResult result = run({"status"});
   EXPECT_EQ(result.status, 1);
-  EXPECT_EQ(result.err,
-            "knobctl: the kernel was started by another build of libknob; boot it anew\n");
+  EXPECT_THAT(result.err, StartsWith("knobctl: the kernel was started by a libknob of another "
+                                     "interface; unload the pools with that version, or "));
   EXPECT_THAT(result.out, HasSubstr("kernel's signature        another"));
+}
+
+TEST_F(Knobctl, StatusAcceptsAKernelOfAnotherBuildDate) {
+  changeState("UPDATE kernel SET build_date = 'Jan  1 2001 01:02:03'");
+  const std::string text = out({"status"});
+  EXPECT_THAT(text, HasSubstr(", built Jan  1 2001 01:02:03\n"));
+  EXPECT_THAT(text, HasSubstr("condition                 usable\n"));
 }
 
 TEST_F(Knobctl, CheckMendsWhatItFinds) {
   EXPECT_EQ(out({"create", "host/opt/a"}), "");
   EXPECT_EQ(out({"check"}), "nothing is wrong\n");
-  Platform::Database(world_.folder() / "kernel.db", Platform::Database::Mode::kReadWrite, 1000)
-      .execute("UPDATE groups SET mem_children = 99 WHERE name = 'opt'");
+  changeState("UPDATE groups SET mem_children = 99 WHERE name = 'opt'");
   const ProcessResult found = run({"check"});
   EXPECT_EQ(found.status, 1);
   EXPECT_THAT(found.out, HasSubstr("host/opt: "));
@@ -337,7 +398,7 @@ TEST_F(Knobctl, AWrongLineIsAUsageError) {
 
 TEST_F(Knobctl, EveryCommandHasHelpOnStandardOutput) {
   for (const char *command :
-       {"boot", "status", "tree", "stats", "facts", "check", "create", "delete", "join"}) {
+       {"boot", "status", "tree", "stats", "facts", "check", "create", "set", "delete", "join"}) {
     EXPECT_THAT(out({"--help"}), HasSubstr(command));
     EXPECT_THAT(out({command, "--help"}), HasSubstr(std::string("knobctl ") + command));
   }

@@ -5,14 +5,14 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <optional>
 #include <thread>
 
+#include "sqlite_memory_limit.h"
 #include "temp_folder.h"
 
 namespace Platform {
 namespace {
-
-using Query = Run;  // testing::Test has a Run of its own
 
 class Sqlite : public testing::Test {
  protected:
@@ -21,8 +21,8 @@ class Sqlite : public testing::Test {
   std::string path() const { return folder_.path() / "x.db"; }
   int64_t rows() {
     Statement count(database_, "SELECT COUNT(*) FROM t");
-    Query run(count);
-    return run.step() ? run.integer(0) : -1;
+    Query query(count);
+    return query.step() ? query.integer(0) : -1;
   }
 
   const ::Test::TempFolder folder_;
@@ -36,15 +36,15 @@ TEST_F(Sqlite, ValuesComeBackAsTheyWereBound) {
   EXPECT_EQ(database_.changedRows(), 1);
   EXPECT_EQ(database_.lastInsertId(), 1);
   Statement select(database_, "SELECT i, r, s, NULL FROM t");
-  Query run(select);
-  ASSERT_TRUE(run.step());
-  EXPECT_EQ(run.integer(0), INT64_MIN);
-  EXPECT_EQ(run.real(1), 0.5);
-  EXPECT_EQ(run.text(2), bytes);
-  EXPECT_TRUE(run.isNull(3));
-  EXPECT_EQ(run.text(3), "");
-  EXPECT_EQ(run.type(2), SQLITE_TEXT);
-  EXPECT_FALSE(run.step());
+  Query query(select);
+  ASSERT_TRUE(query.step());
+  EXPECT_EQ(query.integer(0), INT64_MIN);
+  EXPECT_EQ(query.real(1), 0.5);
+  EXPECT_EQ(query.text(2), bytes);
+  EXPECT_TRUE(query.isNull(3));
+  EXPECT_EQ(query.text(3), "");
+  EXPECT_EQ(query.type(2), SQLITE_TEXT);
+  EXPECT_FALSE(query.step());
 }
 
 TEST_F(Sqlite, EmptyTextsAndNullAreTwoThings) {
@@ -52,9 +52,9 @@ TEST_F(Sqlite, EmptyTextsAndNullAreTwoThings) {
   Query(insert, std::string_view(), nullptr).finish();
   Query(insert, "", nullptr).finish();
   Statement select(database_, "SELECT COUNT(*) FROM t WHERE s = '' AND r IS NULL");
-  Query run(select);
-  ASSERT_TRUE(run.step());
-  EXPECT_EQ(run.integer(0), 2);
+  Query query(select);
+  ASSERT_TRUE(query.step());
+  EXPECT_EQ(query.integer(0), 2);
 }
 
 TEST_F(Sqlite, AStatementRunsAgainAfterAFailure) {
@@ -111,6 +111,19 @@ TEST_F(Sqlite, ATransactionThatSqliteEndedItselfIsLeftAlone) {
   EXPECT_EQ(rows(), 0);
 }
 
+TEST_F(Sqlite, ATransactionEndsWithoutAnyMemory) {
+  TransactionStatements statements(database_);
+  std::optional<Transaction> transaction;
+  transaction.emplace(statements, Transaction::Kind::kWrite);
+  database_.execute("INSERT INTO t VALUES (1, 0.5, 'x')");
+  {
+    const ::Test::SqliteMemoryLimit none(0);
+    transaction.reset();
+  }
+  EXPECT_EQ(rows(), 0);
+  Transaction(statements, Transaction::Kind::kWrite).commit();
+}
+
 TEST_F(Sqlite, AReaderOfAMissingFileFailsAndMakesNone) {
   const std::string missing = folder_.path() / "none.db";
   try {
@@ -128,8 +141,8 @@ TEST_F(Sqlite, AnImmutableFileIsReadWhateverItsNameHolds) {
   { Database(odd, Database::Mode::kCreate, 0).execute("CREATE TABLE only (i)"); }
   Database database(odd, Database::Mode::kImmutable, 0);
   Statement select(database, "SELECT COUNT(*) FROM only");
-  Query run(select);
-  EXPECT_TRUE(run.step());
+  Query query(select);
+  EXPECT_TRUE(query.step());
 }
 
 TEST_F(Sqlite, ALockedFileIsBusyAfterTheWaitThatWasAsked) {

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The C functions: null and small buffers, one wrapper for what is thrown, and what they answer
-// when memory ends. Built with the library's own objects, so that allocations can be made to fail.
+// The C functions: null and small buffers, one wrapper for what is thrown, and what they return
+// without memory. Built with the library's own objects, so that allocations can be made to fail.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -14,6 +14,8 @@
 #include "knob/signature.h"
 #include "knob/status.h"
 #include "platform/knob.h"
+#include "platform/knob_status.h"
+#include "sqlite_memory_limit.h"
 #include "temp_folder.h"
 
 namespace {
@@ -163,16 +165,109 @@ TEST_F(Abi, NodesHaveNumbersOfTheirOwn) {
   EXPECT_EQ(KNOB_Get(0xffff, nullptr, nullptr, 0), number(Status::kBadNode));
 }
 
+class Reasons : public Abi {
+ protected:
+  static std::string textOf(KNOB_ReturnStatus status) { return NUC_ReturnStatusToString(status); }
+
+  KNOB_ReturnStatus lookUp(const char *path) {
+    KNOB_ParamList *list = textList(path);
+    int64_t id = 0;
+    const KNOB_ReturnStatus status =
+        KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, list, &id, sizeof(id));
+    KNOB_ParamListDestroy(list);
+    return status;
+  }
+  KNOB_ReturnStatus setMemory(std::initializer_list<const char *> settings) {
+    KNOB_ParamList *list = KNOB_ParamListCreate(0, static_cast<int>(settings.size()));
+    for (const char *setting : settings) EXPECT_EQ(KNOB_ParamListAddString(list, setting), 0U);
+    const KNOB_ReturnStatus status =
+        KNOB_Set(KNOB_NODE_sched_groups_memAllocationInMB, instance_, list, nullptr, 0);
+    KNOB_ParamListDestroy(list);
+    return status;
+  }
+};
+
+TEST_F(Reasons, AMissingGroupIsNamedAsFarAsThePathIsWrong) {
+  EXPECT_EQ(textOf(lookUp("host/opt/no")), "not found: host/opt/no");
+  EXPECT_EQ(textOf(lookUp("host/no/below")), "not found: host/no");
+  EXPECT_EQ(textOf(lookUp("other")), "not found: other");
+}
+
+TEST_F(Reasons, ABadSettingIsNamedWithItsValues) {
+  EXPECT_EQ(textOf(setMemory({"min=300", "max=200"})), "bad parameter: min 300 is above max 200");
+  EXPECT_EQ(textOf(setMemory({"max=-7"})), "bad parameter: max -7 is negative");
+  EXPECT_EQ(textOf(setMemory({"min=x"})),
+            "bad parameter: \"min=x\": not a decimal number of 64 bits");
+}
+
+TEST_F(Reasons, AnUndoThatSucceedsKeepsTheReason) {
+  const KNOB_ReturnStatus status = lookUp("host/opt/no");
+  ASSERT_EQ(lookUp("host/opt"), 0U);
+  EXPECT_EQ(textOf(status), "not found: host/opt/no");
+}
+
+TEST_F(Reasons, ALaterFailureReplacesTheReason) {
+  const KNOB_ReturnStatus status = lookUp("host/opt/no");
+  EXPECT_EQ(setMemory({"max=-7"}), number(Status::kBadParameter));
+  EXPECT_EQ(textOf(status), "not found");
+  KNOB_ParamList *list = KNOB_ParamListCreate(0, 0);
+  EXPECT_EQ(textOf(KNOB_ParamListAddInt(list, 1)), "bad parameter: the list is full");
+  KNOB_ParamListDestroy(list);
+}
+
+TEST_F(Reasons, AListThatIsNotMadeHasNoReasonOfAnEarlierCall) {
+  const KNOB_ReturnStatus status = lookUp("host/opt/no");
+  EXPECT_EQ(KNOB_ParamListCreate(7, 1), nullptr);
+  EXPECT_EQ(textOf(status), "not found");
+}
+
+TEST_F(Reasons, DestroyingAListKeepsTheReason) {
+  KNOB_ParamList *list = idList(1);
+  const KNOB_ReturnStatus status = lookUp("host/opt/no");
+  KNOB_ParamListDestroy(list);
+  EXPECT_EQ(textOf(status), "not found: host/opt/no");
+}
+
+TEST_F(Reasons, ASignatureCheckLeavesNoReason) {
+  ::Test::writeFile(conf_, "kernel = good\n");
+  EXPECT_EQ(KNOB_CheckSig(nullptr, 0, nullptr), 0);
+  EXPECT_EQ(textOf(KNOB_STATUS_KERNEL_NOT_USABLE), "kernel not usable (see `knobctl status`)");
+}
+
+TEST_F(Reasons, ABadConfigurationIsNamedWithFileAndLine) {
+  ::Test::writeFile(conf_, "\nkernel = good\n");
+  EXPECT_EQ(textOf(lookUp("host")), "kernel not usable (see `knobctl status`): " + conf_ +
+                                        ":2: kernel: bad value \"good\" (one of: emulated, linux)");
+}
+
+TEST_F(Reasons, WithoutMemoryTheStatusHasItsOwnText) {
+  const std::string name(300, 'x');
+  KNOB_ParamList *list = textList(name.c_str());
+  int64_t id = 0;
+  for (int nth = 0; nth < 50; ++nth) {
+    allocationsLeft = nth;
+    const KNOB_ReturnStatus status =
+        KNOB_Set(KNOB_NODE_sched_groupPathNameToID, nullptr, list, &id, sizeof(id));
+    allocationsLeft = -1;
+    const std::string text = textOf(status);
+    EXPECT_TRUE(text == "out of memory" || text == "not found" || text == "not found: " + name)
+        << text;
+  }
+  KNOB_ParamListDestroy(list);
+}
+
 class Signature : public Abi {
  protected:
-  void bootByAnotherBuild() {
+  // Boots a kernel and changes what it keeps of its library.
+  void bootBy(const char *change) {
     int64_t id = 0;
     ASSERT_EQ(lookUp(&id), 0U);
     LiveKernel::instance().close();
     Platform::Database(state_, Platform::Database::Mode::kReadWrite, 0)
-        .execute("UPDATE kernel SET md5 = 'other', build_date = 'Jan  1 2001 01:02:03'");
+        .execute((std::string("UPDATE kernel SET ") + change).c_str());
     ASSERT_TRUE(std::filesystem::remove(state_ + "-facts"));
   }
+  void bootByAnotherInterface() { bootBy("md5 = 'other', build_date = 'Jan  1 2001 01:02:03'"); }
 };
 
 TEST_F(Signature, TheSameBuildMatches) {
@@ -183,8 +278,16 @@ TEST_F(Signature, TheSameBuildMatches) {
   EXPECT_EQ(mine, nullptr);
 }
 
+TEST_F(Signature, AnotherBuildDateAloneMatches) {
+  bootBy("build_date = 'Jan  1 2001 01:02:03'");
+  char running[21] = "untouched";
+  const char *mine = nullptr;
+  EXPECT_EQ(KNOB_CheckSig(running, sizeof(running), &mine), 0);
+  EXPECT_STREQ(running, "untouched");
+}
+
 TEST_F(Signature, AnotherInterfaceIsAMismatchWithBothDates) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[21];
   const char *mine = nullptr;
   EXPECT_NE(KNOB_CheckSig(running, sizeof(running), &mine), 0);
@@ -193,7 +296,7 @@ TEST_F(Signature, AnotherInterfaceIsAMismatchWithBothDates) {
 }
 
 TEST_F(Signature, ASmallBufferGetsWhatFits) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[] = "xxxxxxxx";
   const char *mine = nullptr;
   EXPECT_NE(KNOB_CheckSig(running, 4, &mine), 0);
@@ -202,7 +305,7 @@ TEST_F(Signature, ASmallBufferGetsWhatFits) {
 }
 
 TEST_F(Signature, NullBuffersAreAllowed) {
-  bootByAnotherBuild();
+  bootByAnotherInterface();
   char running[] = "x";
   EXPECT_NE(KNOB_CheckSig(nullptr, 21, nullptr), 0);
   EXPECT_NE(KNOB_CheckSig(running, 0, nullptr), 0);
@@ -249,8 +352,8 @@ TEST_F(NotUsable, AStateThatIsDamagedWhileItIsOpenIsLetGo) {
 void expectOutOfMemoryUntilDone(
     const std::function<KNOB_ReturnStatus()> &call,
     const std::function<void()> &afterFailure = [] {}) {
-  constexpr int kMost = 500;
-  for (int nth = 0; nth < kMost; ++nth) {
+  constexpr int kMax = 500;
+  for (int nth = 0; nth < kMax; ++nth) {
     allocationsLeft = nth;
     const KNOB_ReturnStatus status = call();
     allocationsLeft = -1;
@@ -315,6 +418,28 @@ TEST_F(OutOfMemory, NoGroupIsMade) {
         return KNOB_Set(KNOB_NODE_sched_groups_groupCreate, instance_, name, &id, sizeof(id));
       },
       [&] { EXPECT_EQ(childrenOfOpt(), 0); });
+  EXPECT_EQ(childrenOfOpt(), 1);
+  KNOB_ParamListDestroy(name);
+}
+
+TEST_F(OutOfMemory, NoGroupIsMadeWhenSqliteHasNoMemory) {
+  KNOB_ParamList *name = textList("pool");
+  int64_t id = -1;
+  int failures = 0;
+  for (int moreBytes = 0;; moreBytes += 1000) {
+    ASSERT_LT(moreBytes, 1000000) << "never succeeded";
+    ASSERT_EQ(childrenOfOpt(), 0);  // opens the state, and works after every failure
+    KNOB_ReturnStatus status = 0;
+    {
+      const ::Test::SqliteMemoryLimit limit(moreBytes);
+      status = KNOB_Set(KNOB_NODE_sched_groups_groupCreate, instance_, name, &id, sizeof(id));
+    }
+    if (status == 0) break;
+    ASSERT_EQ(status, number(Status::kOutOfMemory)) << moreBytes;
+    LiveKernel::instance().close();
+    ++failures;
+  }
+  EXPECT_GT(failures, 0);
   EXPECT_EQ(childrenOfOpt(), 1);
   KNOB_ParamListDestroy(name);
 }

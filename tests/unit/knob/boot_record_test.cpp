@@ -8,6 +8,7 @@
 #include <filesystem>
 
 #include "common/sqlite.h"
+#include "knob/emulated/boot.h"
 #include "knob/emulated/emulated_kernel.h"
 #include "temp_folder.h"
 

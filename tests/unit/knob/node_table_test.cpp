@@ -6,10 +6,8 @@
 
 #include <cstring>
 #include <functional>
-#include <set>
 
 #include "fake_kernel.h"
-#include "knob/node_ids.h"
 #include "knob/param_list.h"
 #include "platform/knob_records.h"
 
@@ -93,10 +91,9 @@ class NodeTable : public testing::Test {
   std::vector<char> output_ = std::vector<char>(8192, 'x');
 };
 
-TEST_F(NodeTable, IdsAreUniqueAndEveryNodeCanDoSomething) {
-  std::set<KNOB_NodeID> ids;
+TEST_F(NodeTable, EveryNodeHasANumberAndCanDoSomething) {
   for (const Node &node : nodeTable()) {
-    EXPECT_TRUE(ids.insert(node.id).second) << node.id;
+    EXPECT_NE(node.id, 0);
     EXPECT_TRUE(node.get || node.set || node.list) << node.id;
     EXPECT_EQ(node.get != nullptr, node.getSize != 0) << node.id;
   }
@@ -114,7 +111,7 @@ TEST_F(NodeTable, AGoodCallIsOneCallOfTheKernel) {
 }
 
 TEST_F(NodeTable, AnUnknownNodeIsABadNode) {
-  const Node unknown{0xffff, false, nullptr, 0, nullptr, InputShape::kNothing, 0, nullptr};
+  const Node unknown = Node().numbered(0xffff);
   EXPECT_EQ(get(unknown, nullptr, output_.data(), 8), Status::kBadNode);
   EXPECT_EQ(set(unknown, nullptr, nullptr, output_.data(), 8), Status::kBadNode);
   EXPECT_EQ(enumerate(unknown, nullptr), Status::kBadNode);
@@ -229,14 +226,14 @@ T at(const std::vector<char> &bytes, size_t offset) {
 
 TEST_F(NodeTable, ACommandLineThatIsTooLongIsCutAndStillEndsWithNul) {
   kernel_.hostFacts.bootCommandLine = std::string(5000, 'c');
-  getNode(kernel_, kBootCmdLineNode, nullptr, output_.data(), 4096);
+  getNode(kernel_, NodeIds::system_bootCmdLine, nullptr, output_.data(), 4096);
   EXPECT_EQ(std::string(output_.data()), std::string(4095, 'c'));
   EXPECT_EQ(output_[4096], 'x');
 }
 
 TEST_F(NodeTable, MemoryOfTheTopBitIsNotNegative) {
   kernel_.hostFacts.memoryKB = uint64_t{1} << 63;
-  getNode(kernel_, kMemoryNode, nullptr, output_.data(), 80);
+  getNode(kernel_, NodeIds::memory_comprehensive, nullptr, output_.data(), 80);
   EXPECT_EQ(at<uint64_t>(output_, 0), uint64_t{1} << 63);
 }
 
@@ -244,14 +241,14 @@ TEST_F(NodeTable, AllocationsFillTheirRecords) {
   kernel_.allocation = {1, 2, 3, 4};  // min, max, minLimit, shares
   const KNOB_ParamList instance = group();
   KNOB_MemAllocation memory;
-  getNode(kernel_, kMemAllocationNode, &instance, &memory, sizeof memory);
+  getNode(kernel_, NodeIds::sched_groups_memAllocationInMB, &instance, &memory, sizeof memory);
   EXPECT_EQ(memory.min, 1);
   EXPECT_EQ(memory.max, 2);
   EXPECT_EQ(memory.minLimit, 3);
   EXPECT_EQ(memory.shares, 4);
   EXPECT_EQ(memory.reserved32, 0U);
   KNOB_CpuAllocation cpu;
-  getNode(kernel_, kCpuAllocationNode, &instance, &cpu, sizeof cpu);
+  getNode(kernel_, NodeIds::sched_groups_cpuAllocationInPct, &instance, &cpu, sizeof cpu);
   EXPECT_EQ(cpu.min, 1);
   EXPECT_EQ(cpu.max, 2);
   EXPECT_EQ(cpu.minLimit, 3);
@@ -262,7 +259,8 @@ TEST_F(NodeTable, AllocationsFillTheirRecords) {
 TEST_F(NodeTable, AnOutputMayBeAtAnyAddress) {
   kernel_.statistics = {123, 456};
   const KNOB_ParamList instance = group();
-  getNode(kernel_, kMemoryStatsNode, &instance, output_.data() + 1, sizeof(KNOB_MemoryStats));
+  getNode(kernel_, NodeIds::sched_groups_stats_memoryStats, &instance, output_.data() + 1,
+          sizeof(KNOB_MemoryStats));
   const auto stats = at<KNOB_MemoryStats>(output_, 1);
   EXPECT_EQ(stats.ownReservedPeakKB, 123U);
   EXPECT_EQ(stats.childrenReservedPeakKB, 456U);
@@ -274,15 +272,16 @@ TEST_F(NodeTable, ArgumentsReachTheKernel) {
   const KNOB_ParamList name = input({text("pool")});
   const KNOB_ParamList pid = input({int64_t{77}});
   const KNOB_ParamList settings = input({text("min=3")});
-  setNode(kernel_, kPathToIdNode, nullptr, &path, output_.data(), 8);
+  setNode(kernel_, NodeIds::sched_groupPathNameToID, nullptr, &path, output_.data(), 8);
   EXPECT_EQ(at<int64_t>(output_, 0), 41);
-  setNode(kernel_, kGroupCreateNode, &instance, &name, output_.data(), 8);
+  setNode(kernel_, NodeIds::sched_groups_groupCreate, &instance, &name, output_.data(), 8);
   EXPECT_EQ(at<int64_t>(output_, 0), 42);
-  setNode(kernel_, kGroupDeleteNode, &instance, nullptr, nullptr, 0);
-  setNode(kernel_, kMemAllocationNode, &instance, &settings, nullptr, 0);
-  setNode(kernel_, kCpuAllocationNode, &instance, &settings, nullptr, 0);
-  setNode(kernel_, kMemberWorldsNode, &instance, &pid, nullptr, 0);
-  EXPECT_EQ(listNode(kernel_, kMemberGroupsNode, &instance), (std::vector<int64_t>{7, 8, 9}));
+  setNode(kernel_, NodeIds::sched_groups_delete, &instance, nullptr, nullptr, 0);
+  setNode(kernel_, NodeIds::sched_groups_memAllocationInMB, &instance, &settings, nullptr, 0);
+  setNode(kernel_, NodeIds::sched_groups_cpuAllocationInPct, &instance, &settings, nullptr, 0);
+  setNode(kernel_, NodeIds::sched_groups_members_worlds, &instance, &pid, nullptr, 0);
+  EXPECT_EQ(listNode(kernel_, NodeIds::sched_groups_members_groups, &instance),
+            (std::vector<int64_t>{7, 8, 9}));
   EXPECT_EQ(kernel_.calls,
             (Calls{"lookUp host/opt", "create 9 pool", "remove 9", "set 9 memory min 3",
                    "set 9 cpu min 3", "join 9 77", "children 9"}));

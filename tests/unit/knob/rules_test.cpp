@@ -69,11 +69,11 @@ TEST(Settings, ARefusalSaysWhichEntryAndWhy) {
     (void)parseAllocationChange(Resource::kMemory, {"min=5", "max=x"});
     FAIL();
   } catch (const KernelError &error) {
-    EXPECT_STREQ(error.what(), "\"max=x\": no decimal number");
+    EXPECT_STREQ(error.what(), "\"max=x\": not a decimal number of 64 bits");
   }
 }
 
-constexpr int64_t kMost = INT64_MAX;
+constexpr int64_t kMax = INT64_MAX;
 
 ResourceState state(int64_t min, int64_t max, int64_t minLimit, int64_t childrenSum) {
   return {{min, max, minLimit, -3}, childrenSum};
@@ -153,8 +153,8 @@ TEST(Admission, ShrinkingIsAlwaysAdmitted) {
 }
 
 TEST(Admission, SumsSaturate) {
-  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMost, 100), std::nullopt);
-  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMost, kMost), (Sums{0, kMost}));
+  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMax, 100), std::nullopt);
+  EXPECT_EQ(sumsAfter({state(1, -1, -1, 0), state(0, -1, -1, 10)}, kMax, kMax), (Sums{0, kMax}));
 }
 
 TEST(Admission, EachLimitRefusesOneAboveIt) {

@@ -1,17 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
-// The operations. Each checks all that it needs, then changes all that it has to.
-#include "knob/emulated/kernel_on_state.h"
+// The operations. Each checks everything first and then makes all its changes.
+#include "knob/emulated/emulated_kernel.h"
 
 #include <algorithm>
 #include <optional>
 
+#include "common/process.h"
 #include "knob/admission.h"
 #include "knob/allocation.h"
+#include "knob/emulated/boot.h"
 #include "knob/emulated/boot_record.h"
 #include "knob/emulated/check.h"
-#include "knob/emulated/emulated_kernel.h"
-#include "knob/emulated/first_use.h"
-#include "knob/emulated/processes.h"
 #include "knob/emulated/schema.h"
 #include "knob/names.h"
 #include "knob/peaks.h"
@@ -19,12 +18,12 @@
 namespace Knob {
 namespace {
 
-[[noreturn]] void notFound() {
-  throw KernelError(Status::kNotFound);
+[[noreturn]] void notFound(GroupId id) {
+  throw KernelError(Status::kNotFound, "group " + std::to_string(id));
 }
 
 bool lives(const Member &member) {
-  return processStart(member.pid) == member.started;
+  return Platform::processStart(member.pid) == member.started;
 }
 
 std::vector<Member> onlyLiving(std::vector<Member> members) {
@@ -36,24 +35,24 @@ std::vector<Member> onlyLiving(std::vector<Member> members) {
 
 uint64_t residentBytesOf(const std::vector<Member> &members) {
   uint64_t bytes = 0;
-  for (const Member &member : members) bytes += residentBytes(member.pid);
+  for (const Member &member : members) bytes += Platform::residentBytes(member.pid);
   return bytes;
 }
 
 }  // namespace
 
-KernelOnState::State::State(const std::string &path)
+EmulatedKernel::State::State(const std::string &path)
     : database(openState(path)), transactions(database), store(database) {}
 
-KernelOnState::KernelOnState(std::string path, uint32_t maxVms)
+EmulatedKernel::EmulatedKernel(std::string path, uint32_t maxVms)
     : path_(std::move(path)), maxVms_(maxVms) {}
 
-void KernelOnState::open() {
+void EmulatedKernel::open() {
   if (!state_) state_ = std::make_unique<State>(path_);
 }
 
 template <typename F>
-auto KernelOnState::alone(const F &operation) {
+auto EmulatedKernel::alone(const F &operation) {
   open();
   try {
     return operation();
@@ -63,7 +62,7 @@ auto KernelOnState::alone(const F &operation) {
 }
 
 template <typename F>
-auto KernelOnState::transact(Kind kind, const F &operation) {
+auto EmulatedKernel::transact(Kind kind, const F &operation) {
   return alone([&] {
     Platform::Transaction transaction(state_->transactions, kind);
     if constexpr (std::is_void_v<decltype(operation())>) {
@@ -77,15 +76,21 @@ auto KernelOnState::transact(Kind kind, const F &operation) {
   });
 }
 
-GroupId KernelOnState::lookUp(std::string_view path) {
+GroupId EmulatedKernel::lookUp(std::string_view path) {
   const auto components = splitPath(path);
-  if (!components || components->front() != kRootName) notFound();
-
+  if (!components || components->front() != kRootName) {
+    throw KernelError(Status::kNotFound, std::string(path));
+  }
   const auto walk = [&] {
     GroupId id = kHostId;
     for (size_t i = 1; i < components->size(); ++i) {
-      const auto child = store().child(id, (*components)[i]);
-      if (!child) notFound();
+      const std::string_view name = (*components)[i];
+      const auto child = store().child(id, name);
+      if (!child) {
+        // The views point into the path.
+        const auto length = static_cast<size_t>(name.data() + name.size() - path.data());
+        throw KernelError(Status::kNotFound, std::string(path.substr(0, length)));
+      }
       id = *child;
     }
     return id;
@@ -94,10 +99,11 @@ GroupId KernelOnState::lookUp(std::string_view path) {
   return components->size() <= 2 ? alone(walk) : transact(Kind::kRead, walk);
 }
 
-GroupId KernelOnState::create(GroupId parent, std::string_view name) {
-  if (!isGroupName(name)) throw KernelError(Status::kBadParameter, "no name for a group");
+GroupId EmulatedKernel::create(GroupId parent, std::string_view name) {
+  if (!isGroupName(name))
+    throw KernelError(Status::kBadParameter, "\"" + std::string(name) + "\" cannot name a group");
   return transact(Kind::kWrite, [&] {
-    if (!store().exists(parent)) notFound();
+    if (!store().exists(parent)) notFound(parent);
     if (store().child(parent, name)) throw KernelError(Status::kExists);
     if (!livingMembers(parent).empty()) {
       throw KernelError(Status::kBusy, "processes are in the parent group");
@@ -106,9 +112,9 @@ GroupId KernelOnState::create(GroupId parent, std::string_view name) {
   });
 }
 
-void KernelOnState::remove(GroupId id) {
+void EmulatedKernel::remove(GroupId id) {
   if (id == kHostId || id == kOptId) {
-    throw KernelError(Status::kPermissionDenied, "the group is there for good");
+    throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be deleted");
   }
   transact(Kind::kWrite, [&] {
     const ResourceRow memory = require(id, Resource::kMemory);
@@ -122,11 +128,11 @@ void KernelOnState::remove(GroupId id) {
   });
 }
 
-Allocation KernelOnState::readAllocation(GroupId id, Resource resource) {
+Allocation EmulatedKernel::readAllocation(GroupId id, Resource resource) {
   return alone([&] { return require(id, resource).state.allocation; });
 }
 
-void KernelOnState::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
+void EmulatedKernel::setAllocation(GroupId id, Resource resource, const AllocationChange &change) {
   transact(Kind::kWrite, [&] {
     const ResourceRow row = require(id, resource);
     const Allocation wanted = changedAllocation(row.state.allocation, change);
@@ -145,31 +151,31 @@ void KernelOnState::setAllocation(GroupId id, Resource resource, const Allocatio
   });
 }
 
-std::vector<GroupId> KernelOnState::childGroups(GroupId id) {
+std::vector<GroupId> EmulatedKernel::childGroups(GroupId id) {
   return transact(Kind::kRead, [&] {
     std::vector<GroupId> children = store().children(id);
-    if (children.empty() && !store().exists(id)) notFound();
+    if (children.empty() && !store().exists(id)) notFound(id);
     return children;
   });
 }
 
-std::vector<int64_t> KernelOnState::members(GroupId id) {
+std::vector<int64_t> EmulatedKernel::members(GroupId id) {
   return transact(Kind::kRead, [&] {
-    if (!store().exists(id)) notFound();
+    if (!store().exists(id)) notFound(id);
     std::vector<int64_t> pids;
     for (const Member &member : livingMembers(id)) pids.push_back(member.pid);
     return pids;
   });
 }
 
-void KernelOnState::join(GroupId id, int64_t pid) {
+void EmulatedKernel::join(GroupId id, int64_t pid) {
   transact(Kind::kWrite, [&] {
-    if (!store().exists(id)) notFound();
+    if (!store().exists(id)) notFound(id);
     if (store().hasChildren(id)) throw KernelError(Status::kBusy, "child groups are in it");
     requireAnyMemory(id);
-    const auto started = processStart(pid);
-    if (!started) throw KernelError(Status::kNotFound, "no living process of that id");
-    // Here a write is due anyway, so that what is left of the dead goes with it.
+    const auto started = Platform::processStart(pid);
+    if (!started) throw KernelError(Status::kNotFound, "process " + std::to_string(pid));
+    // This call writes anyway, so it also removes the dead members.
     for (const Member &member : store().membersOf(id)) {
       if (!lives(member)) store().removeMember(member.pid);
     }
@@ -177,11 +183,11 @@ void KernelOnState::join(GroupId id, int64_t pid) {
   });
 }
 
-MemoryStatistics KernelOnState::memoryStatistics(GroupId id) {
+MemoryStatistics EmulatedKernel::memoryStatistics(GroupId id) {
   return alone([&] { return require(id, Resource::kMemory).peaks; });
 }
 
-HostFacts KernelOnState::facts() {
+HostFacts EmulatedKernel::facts() {
   if (!state_) {
     if (const auto record = readBootRecord(path_)) {
       HostFacts facts = record->facts;
@@ -192,14 +198,14 @@ HostFacts KernelOnState::facts() {
   return alone([&] { return store().facts(maxVms_); });
 }
 
-BuildSignature KernelOnState::signature() {
+BuildSignature EmulatedKernel::signature() {
   if (!state_) {
     if (const auto record = readBootRecord(path_)) return record->signature;
   }
   return alone([&] { return store().signature(); });
 }
 
-GroupView KernelOnState::view(GroupId id) {
+GroupView EmulatedKernel::view(GroupId id) {
   return transact(Kind::kRead, [&] {
     const ResourceState memory = require(id, Resource::kMemory).state;
     const ResourceState cpu = require(id, Resource::kCpu).state;
@@ -215,24 +221,24 @@ GroupView KernelOnState::view(GroupId id) {
   });
 }
 
-std::vector<Finding> KernelOnState::check(bool repair) {
+std::vector<Finding> EmulatedKernel::check(bool repair) {
   return transact(repair ? Kind::kWrite : Kind::kRead,
                   [&] { return checkState(state_->database, path_, repair); });
 }
 
-ResourceRow KernelOnState::require(GroupId id, Resource resource) {
+ResourceRow EmulatedKernel::require(GroupId id, Resource resource) {
   const auto row = store().read(id, resource);
-  if (!row) notFound();
+  if (!row) notFound(id);
   return *row;
 }
 
-void KernelOnState::reserve(GroupId id, Resource resource, const ResourceRow &row,
-                            const Allocation &wanted) {
+void EmulatedKernel::reserve(GroupId id, Resource resource, const ResourceRow &row,
+                             const Allocation &wanted) {
   std::vector<ResourceState> states = {row.state};
   std::vector<GroupId> ids = {id};
   std::vector<MemoryStatistics> peaks = {row.peaks};
 
-  // Where the group's own reservation stays, nothing above it can change.
+  // While the group's own reservation stays the same, nothing changes above it.
   const bool changes = reservationOf({wanted, row.state.childrenSum}) != reservationOf(row.state);
   for (GroupId above = row.parent; changes && above != 0;) {
     const ResourceRow aboveRow = require(above, resource);
@@ -258,11 +264,11 @@ void KernelOnState::reserve(GroupId id, Resource resource, const ResourceRow &ro
   }
 }
 
-std::vector<Member> KernelOnState::livingMembers(GroupId id) {
+std::vector<Member> EmulatedKernel::livingMembers(GroupId id) {
   return onlyLiving(store().membersOf(id));
 }
 
-std::vector<Member> KernelOnState::livingBelow(GroupId id) {
+std::vector<Member> EmulatedKernel::livingBelow(GroupId id) {
   // A group has either children or processes of its own.
   if (!store().hasChildren(id)) return livingMembers(id);
   std::vector<Member> members = onlyLiving(store().allMembers());
@@ -272,13 +278,13 @@ std::vector<Member> KernelOnState::livingBelow(GroupId id) {
   return members;
 }
 
-bool KernelOnState::isBelow(GroupId id, GroupId ancestor) {
+bool EmulatedKernel::isBelow(GroupId id, GroupId ancestor) {
   while (id != 0 && id != ancestor) id = store().parentOf(id);
   return id == ancestor;
 }
 
-// A group that may have none has none for its child groups and processes either.
-void KernelOnState::requireAnyMemory(GroupId id) {
+// A maximum of 0 leaves no memory for child groups and processes either.
+void EmulatedKernel::requireAnyMemory(GroupId id) {
   for (ResourceRow row; id != 0; id = row.parent) {
     row = require(id, Resource::kMemory);
     if (row.state.allocation.max == 0) {
@@ -287,7 +293,7 @@ void KernelOnState::requireAnyMemory(GroupId id) {
   }
 }
 
-void KernelOnState::requireMemoryFor(GroupId id, int64_t maxMB) {
+void EmulatedKernel::requireMemoryFor(GroupId id, int64_t maxMB) {
   const uint64_t usedKB = residentBytesOf(livingBelow(id)) / 1024;
   if (usedKB > kilobytes(maxMB)) {
     throw KernelError(Status::kMemoryBusy,
@@ -295,14 +301,10 @@ void KernelOnState::requireMemoryFor(GroupId id, int64_t maxMB) {
   }
 }
 
-std::string emulatedStatePath(const Configuration &configuration) {
-  return configuration.statePath ? *configuration.statePath : defaultStatePath();
-}
-
 std::unique_ptr<Kernel> openEmulatedKernel(const Configuration &configuration, Opening opening) {
   const std::string path = emulatedStatePath(configuration);
   if (!stateExists(path)) bootOnFirstUse(path);
-  auto kernel = std::make_unique<KernelOnState>(path, configuration.maxVms);
+  auto kernel = std::make_unique<EmulatedKernel>(path, configuration.maxVms);
   if (opening == Opening::kAtOnce) kernel->open();
   return kernel;
 }
