@@ -82,7 +82,7 @@ class Update {
 
   // A group without a record belongs to another program and keeps its weight.
   void give(Group &child, const CpuDivision &division, size_t next) {
-    const StoredRecord stored = readRecord(child.fd());
+    const StoredRecord stored = distribution_.readCounted(child);
     const CpuChild own = distribution_.childOf(stored.record);
     if (stored.isStored) write(child, cpuWeightOf(division, own));
     const bool isDivided =
