@@ -1,12 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads and computes an expression in one pass, by functions that mirror the grammar:
+// Reads and computes an expression in one pass, with one function for each rule of the grammar:
 //
 //   expression := operand tail
 //   tail       := ( "*" operand | "/" operand )* [ "+" expression | "-" operand tail ]
 //   operand    := ( "(" expression ")" | number | name | function ) chain
 //   chain      := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
 //
-// So logical words bind tighter than arithmetic, and everything but "*" and "/" groups to the
+// So logical words bind tighter than arithmetic, and all operators except "*" and "/" group to the
 // right: `10 - 2 - 3` is 11. Definitions rely on it.
 #include "calc/evaluator.h"
 
@@ -19,10 +19,10 @@
 namespace Calc {
 namespace {
 
-// Deep enough for every text that somebody wrote, shallow enough for the smallest usual stack.
+// Far deeper than people write, and within a stack of 8 MiB. The outermost expression is a level.
 constexpr int kMaxLevels = 5000;
 
-// The zero that changes nothing that it is added to: a positive one would make a -0 positive.
+// -0.0f, the additive identity: adding +0 would turn -0 into +0.
 constexpr float kNoAddend = -0.0F;
 
 constexpr const char *kTooDeep = "expression nested too deeply";
@@ -57,8 +57,8 @@ const char *skipSpace(const char *at) {
   return at;
 }
 
-// What needs an object to work on, messages above all, is a function of its own: inlined, it would
-// widen the frames of the recursion, most of all with a sanitizer's red zones around the object.
+// These functions build strings and are never inlined: their locals would enlarge every stack frame
+// of the recursion, most of all with a sanitizer's red zones around them.
 [[noreturn, gnu::noinline]] void fail(const char *message, const char *position) {
   throw Exception(message, position);
 }
@@ -85,9 +85,9 @@ enum class Word { kNone, kMin, kMax, kCeil, kNot, kTrue, kFalse };
   return Word::kNone;
 }
 
-// The cursor says where reading stopped. It is a member, not a local of every level, to keep the
-// frames of the recursion small; a procedure that reads inside brackets puts it at the opening
-// one first, because "True" and "False" leave it where they find it.
+// The cursor is where reading stopped. It is a member and not a local of every level to keep the
+// stack frames of the recursion small. A function that reads inside parentheses first sets it to
+// the opening one, because "True" and "False" do not move it.
 class Reader {
  public:
   Reader(const char *text, const VariableTable &variables)
@@ -117,8 +117,8 @@ class Reader {
 
   const VariableTable &variables_;
   const char *cursor_;
-  const char *nextOperator_;  // an operator before this has been taken already
-  int level_ = 0;             // not restored by an exception, which ends the whole reading
+  const char *nextOperator_;  // the next operator is here or later
+  int level_ = 0;             // not restored by an exception: a Reader evaluates one text, once
 };
 
 float Reader::evaluate() {
@@ -201,7 +201,7 @@ float Reader::readNumber(const char *start) {
   return static_cast<float>(value);
 }
 
-// A variable comes first: it hides every word of the language.
+// A variable hides the word of the language that has the same name.
 float Reader::readNamed(const char *start) {
   const char *after = start;
   while (isNamePart(*after)) ++after;
@@ -218,7 +218,7 @@ float Reader::readNamed(const char *start) {
       return readCeil(after);
     case Word::kNot:
       return readNot(after);
-    // Neither word moves the cursor. Texts that hold them fail; that is known and kept.
+    // Neither word moves the cursor, so every text with one fails. Part of the language.
     case Word::kTrue:
       return 1.0F;
     case Word::kFalse:
@@ -234,7 +234,7 @@ float Reader::readNamed(const char *start) {
   return found == variables_.end() ? nullptr : &found->second;
 }
 
-// On a tie, or with a NaN, the first argument wins.
+// On a tie, or if either argument is NaN, the result is the first argument.
 float Reader::readMinMax(Word word, const char *after) {
   const char *const name = word == Word::kMin ? "min" : "max";
   const char *const open = skipSpace(after);
@@ -265,8 +265,8 @@ float Reader::readNot(const char *after) {
 }
 
 // chain := [ "and" operand tail | "or" operand tail | "if" operand [ "else" operand ] tail ]
-// No check is made that a word ends there: `3order` reads as 3 or der. The tail belongs to the
-// word's level: in `1 and 1 * 1 and 1 * ...` each word stands inside the tail of the one before.
+// A word need not end there: `3order` reads as 3 or der. The tail counts as part of the word's
+// level, because in `1 and 1 * 1 and 1 * ...` each word is inside the tail of the one before.
 float Reader::readChain(float value) {
   const char *const word = skipSpace(cursor_);
   if (startsWith(word, "and")) return readAnd(word, value);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Evaluates "!calc" nodes and gives the faults of their expressions a place in the file.
+// Evaluates "!calc" nodes and adds the place in the file to the faults of their expressions.
 #include "calc/node_evaluator.h"
 
 #include <string>
@@ -22,8 +22,8 @@ float evaluateScalar(const YAML::Node &node, const VariableTable &variables) {
   }
 }
 
-// The text is read as an expression whatever its tag, and its faults are reported without the
-// rest of the text.
+// The text is an expression whatever its tag. Unlike in evaluateScalar, a fault's message does not
+// quote the rest of the text.
 float evaluateResult(const YAML::Node &result, const VariableTable &variables) {
   const std::string text = Yaml::scalarText(result);
   try {
@@ -33,8 +33,8 @@ float evaluateResult(const YAML::Node &result, const VariableTable &variables) {
   }
 }
 
-// Definitions see the caller's variables only, never one another. The last entry is the result,
-// whatever its key: "=" only keeps an entry out of the definitions.
+// A definition can use the caller's variables, but no other definition. The last entry is the
+// result, whatever its key: "=" only keeps an entry out of the definitions.
 float evaluateMapping(const YAML::Node &node, const VariableTable &variables) {
   VariableTable local = variables;
   YAML::Node last(YAML::NodeType::Undefined);

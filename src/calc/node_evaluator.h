@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The value of a node tagged "!calc": one expression, or a mapping of local definitions that ends
-// with the expression.
+// The value of a node tagged "!calc": an expression, or a mapping of local definitions whose last
+// entry is the expression.
 #pragma once
 
 #include <yaml-cpp/yaml.h>
@@ -9,8 +9,8 @@
 
 namespace Calc {
 
-// The node's tag is not looked at. Throws Loader::Exception at the node at fault, and what the
-// conversion of a local definition throws.
+// Ignores the node's tag. Throws Loader::Exception with the place of the fault, the yaml library's
+// conversion errors, and any exception from the conversion of a local definition.
 float EvaluateNode(const YAML::Node &node, const VariableTable &variables);
 
 }  // namespace Calc

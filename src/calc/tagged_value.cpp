@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Chooses by a value's tag who converts it, and bounds how far one value may lead into others.
+// Converts a value by its tag, and limits how many other values it may contain.
 #include "calc/tagged_value.h"
 
 #include <string>

@@ -1,12 +1,14 @@
 // SPDX-License-Identifier: Apache-2.0
-// The one door from a pool's value to a number or a truth value: plain, "!calc" or "!config".
+// Converts every value of a pool definition, plain, "!calc" or "!config", to a number or a truth
+// value.
 #pragma once
 
 #include <yaml-cpp/yaml.h>
 
 #include "calc/variable_table.h"
 
-// Throw Loader::Exception at the node, the yaml library's conversion errors, and what the
-// evaluation of the tag throws.
+// Throw Loader::Exception with the node's place, the yaml library's conversion errors, and any
+// exception from the evaluation of the tag. Bounded: at most 500 values, one inside the other, and
+// 100,000 in all.
 float NodeToFloat(const YAML::Node &node, const Calc::VariableTable &variables);
 bool NodeToBool(const YAML::Node &node, const Calc::VariableTable &variables);

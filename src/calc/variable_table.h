@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The variables that an expression may name.
+// The variables that an expression can use.
 #pragma once
 
 #include <string>
@@ -7,7 +7,7 @@
 
 namespace Calc {
 
-// Names are matched byte for byte and may hold dots.
+// Names are compared byte for byte and may contain dots.
 using VariableTable = std::unordered_map<std::string, float>;
 
 }  // namespace Calc

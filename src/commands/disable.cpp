@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Zeroes the memory of named groups and deletes them, waiting for busy ones on request.
+// Sets the memory of the named groups to zero and deletes them. Waits for busy ones on request.
 #include <unistd.h>
 
 #include <cstdlib>
@@ -10,6 +10,9 @@
 
 #include "commands/commands.h"
 #include "commands/operands.h"
+#include "commands/stop_signals.h"
+#include "console/message.h"
+#include "console/result.h"
 #include "platform/knob_status.h"
 #include "sched/exception.h"
 #include "sched/scheduler_group.h"
@@ -42,21 +45,21 @@ bool isBusy(const Sched::Exception &failure) {
   return failure.status == KNOB_STATUS_MEMORY_BUSY || failure.status == KNOB_STATUS_BUSY;
 }
 
-// Whether the pool is done with; false asks for another attempt.
+// Returns false if the group is busy and the wait is not over.
 bool tryDisable(const std::string &name, const Options &options) {
   try {
     disableOnce(name, options);
   } catch (const Sched::Exception &failure) {
     if (failure.status == KNOB_STATUS_NOT_FOUND) {
-      std::cout << name << ": " << failure.what() << std::endl;
+      std::cout << Console::resultText(name + ": " + failure.what()) << std::endl;
       return true;
     }
     if (isBusy(failure)) {
       if (options.deadlineSeconds < time(nullptr)) throw Sched::Exception(name, KNOB_STATUS_BUSY);
       return false;
     }
-    // The entry point reports it once more, without the name.
-    std::cerr << name << ": " << failure.what() << std::endl;
+    // The entry point reports it a second time, without the name.
+    Console::printError(name, ": ", failure.what());
     throw;
   }
   return true;
@@ -72,17 +75,24 @@ int cmdDisable(int argc, char **argv) {
     } else if (option == 'w') {
       options.deadlineSeconds = time(nullptr) + static_cast<int>(strtol(optarg, nullptr, 10));
     } else {
-      std::cerr << kUsage;
+      Console::printUsage(kUsage);
       return option == 'h' ? 0 : 1;
     }
   }
   const std::vector<std::string> names = operands(argc, argv);
   if (names.empty()) {
-    std::cerr << kUsage;
+    Console::printUsage(kUsage);
     return 1;
   }
+  Commands::ignoreBrokenPipes();
+  Commands::StopSignals signals;
   for (const std::string &name : names) {
-    while (!tryDisable(name, options)) usleep(kRetryMicroseconds);
+    while (!tryDisable(name, options)) {
+      usleep(kRetryMicroseconds);
+      signals.endIfStopped();
+    }
+    signals.endIfStopped();
   }
+  Console::flushResults();
   return 0;
 }

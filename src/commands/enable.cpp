@@ -2,12 +2,13 @@
 // Restores disabled pools from their definitions in the definition folder.
 #include <unistd.h>
 
-#include <iostream>
 #include <string>
 #include <vector>
 
 #include "commands/commands.h"
 #include "commands/operands.h"
+#include "commands/stop_signals.h"
+#include "console/message.h"
 #include "loader/definition_files.h"
 #include "platform/knob_status.h"
 #include "sched/exception.h"
@@ -24,7 +25,7 @@ constexpr const char *kUsage =
     "    An existing pool has its memory allocation restored from the yaml\n"
     "    definition.\n";
 
-// A group whose maximum is not 0 counts as enabled and is left as it is.
+// A group whose maximum is not 0 is enabled and is not changed.
 void restoreMemory(const Loader::ResourcePoolImpl &pool) {
   const int64_t id = Sched::pathNameToId(pool.name);
   Sched::MemAllocation current;
@@ -39,7 +40,7 @@ void enable(const Loader::ResourcePoolImpl &pool) {
     if (failure.status == KNOB_STATUS_NOT_FOUND) {
       Sched::createGroup(pool.name, pool.mem, pool.cpu);
     } else {
-      std::cerr << pool.name << ": " << failure.what() << std::endl;
+      Console::printError(pool.name, ": ", failure.what());
     }
   }
 }
@@ -50,10 +51,15 @@ int cmdEnable(int argc, char **argv) {
   const int option = getopt(argc, argv, "h");
   const std::vector<std::string> names = operands(argc, argv);
   if (option != -1 || names.empty()) {
-    std::cerr << kUsage;
+    Console::printUsage(kUsage);
     return option == 'h' ? 0 : 1;
   }
+  Commands::ignoreBrokenPipes();
   const Loader::PoolList pools = Loader::loadPools({}, false);
-  for (const std::string &name : names) enable(*Loader::findPool(name, pools));
+  Commands::StopSignals signals;
+  for (const std::string &name : names) {
+    enable(*Loader::findPool(name, pools));
+    signals.endIfStopped();
+  }
   return 0;
 }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The older option mode, kept for scripts that size and watch one memory group at a time.
+// The option mode: sizes and watches one memory group at a time. Kept for older scripts.
 #include <syslog.h>
 #include <unistd.h>
 
@@ -10,10 +10,11 @@
 #include <cstdlib>
 #include <iostream>
 #include <optional>
-#include <string>
 
 #include "commands/commands.h"
 #include "commands/legacy_group.h"
+#include "console/message.h"
+#include "console/result.h"
 #include "platform/knob.h"
 
 namespace {
@@ -37,9 +38,10 @@ constexpr int kKernelFailure = 4;
 
 constexpr uint32_t kPollMicroseconds = 100000;
 
+// Nothing here takes memory: the mode works when memory is short.
 struct Request {
   int64_t groupId = -1;
-  std::string groupName = "<not initialized>";
+  const char *groupName = "<not initialized>";  // the path that was given
   int memoryMB = 0;
   int64_t waitMicroseconds = 0;
   bool checkEmpty = false;
@@ -61,13 +63,12 @@ void requireMatchingKernel() {
   char runningBuild[21] = {};
   const char *myBuild = "";
   if (KNOB_CheckSig(runningBuild, sizeof runningBuild, &myBuild) == 0) return;
-  fprintf(stderr,
-          "error: md5 signature mismatch with running nucleus built on %s (my build date: %s)\n",
-          runningBuild, myBuild);
+  Console::printError("error: md5 signature mismatch with running nucleus built on ", runningBuild,
+                      " (my build date: ", myBuild, ")");
   exit(kBadOption);
 }
 
-bool takeGroup(const char *path, Request &request) {
+bool readGroup(const char *path, Request &request) {
   if (const auto status = Legacy::lookUpGroup(path, &request.groupId)) {
     logMessage("Group %s was not found: %s\n", path, NUC_ReturnStatusToString(status));
     return false;
@@ -76,7 +77,7 @@ bool takeGroup(const char *path, Request &request) {
   return true;
 }
 
-bool takeMemorySize(const char *text, Request &request) {
+bool readMemorySize(const char *text, Request &request) {
   if (*text == '\0') {
     logMessage("memory size (MB) is not specified\n");
     return false;
@@ -91,7 +92,7 @@ bool takeMemorySize(const char *text, Request &request) {
   return true;
 }
 
-bool takeWaitTime(const char *text, Request &request) {
+bool readWaitTime(const char *text, Request &request) {
   if (*text == '\0') {
     logMessage("wait time is not specified\n");
     return false;
@@ -102,13 +103,13 @@ bool takeWaitTime(const char *text, Request &request) {
     logMessage("incorrect value for wait time specified: %s\n", text);
     return false;
   }
-  // Too many seconds wrap; as signed numbers they would have no defined product.
+  // Too many seconds wrap; a product of signed numbers that overflows would be undefined.
   request.waitMicroseconds = static_cast<int64_t>(static_cast<uint64_t>(seconds) * 1000000U);
   request.wait = true;
   return true;
 }
 
-// The exit status when an option ends the process at once.
+// The exit status, if an option ends the process.
 std::optional<int> parseOptions(int argc, char **argv, Request &request) {
   for (int option; (option = getopt(argc, argv, "eg:im:w:h")) != -1;) {
     switch (option) {
@@ -116,19 +117,19 @@ std::optional<int> parseOptions(int argc, char **argv, Request &request) {
         request.checkEmpty = true;
         break;
       case 'g':
-        if (!takeGroup(optarg, request)) return kBadOption;
+        if (!readGroup(optarg, request)) return kBadOption;
         break;
       case 'i':
         request.info = true;
         break;
       case 'm':
-        if (!takeMemorySize(optarg, request)) return kBadOption;
+        if (!readMemorySize(optarg, request)) return kBadOption;
         break;
       case 'w':
-        if (!takeWaitTime(optarg, request)) return kBadOption;
+        if (!readWaitTime(optarg, request)) return kBadOption;
         break;
       default:
-        std::cerr << kUsage;
+        Console::printUsage(kUsage);
         return option == 'h' ? kSuccess : kBadOption;
     }
   }
@@ -138,16 +139,17 @@ std::optional<int> parseOptions(int argc, char **argv, Request &request) {
 int reportEmptiness(const Request &request) {
   int count = 0;
   if (const auto status = Legacy::countMemberGroups(request.groupId, &count)) {
-    logMessage("Failed to check group %s: %s\n", request.groupName.c_str(),
+    logMessage("Failed to check group %s: %s\n", request.groupName,
                NUC_ReturnStatusToString(status));
     return kKernelFailure;
   }
-  std::cout << (count == 0 ? "empty" : "not empty") << std::endl;
+  std::cout << (count == 0 ? "empty\n" : "not empty\n");
+  Console::flushResults();
   return count == 0 ? kSuccess : kNotEmpty;
 }
 
-// A kernel that cannot be asked counts as a group that is not empty. The counter takes the sleeps
-// alone and wraps: a budget beyond its range is never used up.
+// A kernel call that fails counts as a group that is not empty. The counter adds up the sleeps
+// alone and wraps, so a budget beyond its range is never used up.
 bool pollUntilEmpty(const Request &request) {
   if (request.waitMicroseconds < 1) return false;
   uint32_t elapsedMicroseconds = 0;
@@ -162,10 +164,11 @@ bool pollUntilEmpty(const Request &request) {
 
 int waitUntilEmpty(const Request &request) {
   if (!pollUntilEmpty(request)) {
-    logMessage("Timeout waiting for %s to be empty", request.groupName.c_str());
+    logMessage("Timeout waiting for %s to be empty", request.groupName);
     return kTimedOut;
   }
-  std::cout << "empty" << std::endl;
+  std::cout << "empty\n";
+  Console::flushResults();
   return kSuccess;
 }
 
@@ -177,7 +180,7 @@ uint64_t kbToMB(uint64_t kb) {
 int printInfo(const Request &request) {
   Legacy::MemoryReport report;
   if (const auto status = Legacy::readMemoryReport(request.groupId, &report)) {
-    logMessage("Failed to get groups %s stats: %s\n", request.groupName.c_str(),
+    logMessage("Failed to get groups %s stats: %s\n", request.groupName,
                NUC_ReturnStatusToString(status));
     return kKernelFailure;
   }
@@ -185,21 +188,21 @@ int printInfo(const Request &request) {
          ",\n\"rminchildpeakMB\": %" PRId64 "\n}\n",
          report.minMB, report.maxMB, static_cast<int64_t>(kbToMB(report.ownPeakKB)),
          static_cast<int64_t>(kbToMB(report.childrenPeakKB)));
-  fflush(stdout);
+  Console::flushResults();
   return kSuccess;
 }
 
 int setMemorySize(const Request &request) {
   if (const auto status = Legacy::setGroupMemSize(request.groupId, request.memoryMB)) {
-    logMessage("Failed to set group %s mem: %s\n", request.groupName.c_str(),
+    logMessage("Failed to set group %s mem: %s\n", request.groupName,
                NUC_ReturnStatusToString(status));
     return kKernelFailure;
   }
   return kSuccess;
 }
 
-// Emptiness is checked alone; a wait leaves the information out.
-int carryOut(const Request &request) {
+// -e ignores all other options, and -w ignores -i.
+int runRequest(const Request &request) {
   if (request.checkEmpty) return reportEmptiness(request);
   if (request.wait) {
     if (const int result = waitUntilEmpty(request)) return result;
@@ -219,5 +222,5 @@ int legacyMain(int argc, char **argv) {
     logMessage("Group -g parameter was not specified\n");
     return kBadOption;
   }
-  return carryOut(request);
+  return runRequest(request);
 }

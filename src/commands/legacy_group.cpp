@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Talks to KNOB for the option mode.
+// The exchanges with KNOB of the option mode.
 #include "commands/legacy_group.h"
 
 #include <array>

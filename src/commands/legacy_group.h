@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The kernel calls of the option mode, which answers with statuses where the sub-commands throw.
+// The kernel calls of the option mode. They return statuses; the operations of the sub-commands
+// throw.
 #pragma once
 
 #include <cstdint>
@@ -15,8 +16,8 @@ struct MemoryReport {
   uint64_t childrenPeakKB = 0;  // of its children's
 };
 
-// All return 0 or the kernel's status; results are untouched unless it is 0. A parameter list
-// that cannot be made counts as "out of memory".
+// Each returns 0 or the kernel's status, and does not change its result unless it returns 0. A
+// parameter list that cannot be created is "out of memory".
 KNOB_ReturnStatus lookUpGroup(const char *path, int64_t *id);
 KNOB_ReturnStatus countMemberGroups(int64_t id, int *count);
 KNOB_ReturnStatus readMemoryReport(int64_t id, MemoryReport *report);

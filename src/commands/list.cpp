@@ -1,15 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
-// Prints the declared pools as a table or as comma-separated values; reads definitions alone.
+// Prints the declared pools as a table or as comma-separated values. Makes no call on groups.
 #include <unistd.h>
 
 #include <iomanip>
 #include <iostream>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
 #include "commands/commands.h"
 #include "commands/operands.h"
+#include "console/message.h"
+#include "console/result.h"
 #include "loader/definition_files.h"
 
 namespace {
@@ -29,7 +30,7 @@ struct Form {
   char separator;
 };
 
-// Scripts split the table at the NUL, which a terminal does not show.
+// Scripts split the table at the NUL. A terminal does not show it.
 constexpr Form kTable = {48, 12, '\0'};
 constexpr Form kCsv = {0, 0, ','};
 
@@ -72,18 +73,14 @@ constexpr Column kColumns[] = {
     {"cpuShares", [](auto &pool) { return sharesToString(pool.cpu.shares); }},
 };
 
-// A list that could not be written is no list: the stream's own silence would hide a full disk.
-void endLine() {
-  if (!(std::cout << std::endl)) throw std::runtime_error("cannot write to standard output");
-}
-
 template <typename TextOf>
 void printLine(const Form &form, const std::string &name, TextOf textOf) {
-  std::cout << std::left << std::setw(form.nameWidth) << name << std::right;
+  std::cout << std::left << std::setw(form.nameWidth) << Console::resultText(name) << std::right;
   for (const Column &column : kColumns) {
     std::cout << form.separator << std::setw(form.valueWidth) << textOf(column);
   }
-  endLine();
+  std::cout << '\n';
+  Console::flushResults();
 }
 
 }  // namespace
@@ -95,7 +92,7 @@ int cmdList(int argc, char **argv) {
       form = kCsv;
       continue;
     }
-    std::cerr << kUsage;
+    Console::printUsage(kUsage);
     return option == 'h' ? 0 : 1;
   }
   printLine(form, "name", [](const Column &column) { return column.title; });

@@ -1,11 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
-// Creates the enabled pools as kernel groups; a batch that fails is undone.
+// Creates the enabled pools as kernel groups.
 #include <unistd.h>
 
-#include <iostream>
-
+#include "commands/batch.h"
 #include "commands/commands.h"
 #include "commands/operands.h"
+#include "commands/stop_signals.h"
+#include "console/message.h"
 #include "loader/definition_files.h"
 #include "platform/knob_status.h"
 #include "sched/exception.h"
@@ -20,33 +21,22 @@ constexpr const char *kUsage =
     "Flags:\n"
     "    -q              Silence diagnostic messages.\n";
 
-// Deletes the groups of this run, newest first. Its own failures are reported and do not stop it.
-void undo(const Loader::PoolList &created) {
-  for (auto pool = created.rbegin(); pool != created.rend(); ++pool) {
-    try {
-      Sched::deleteGroup(Sched::pathNameToId((*pool)->name));
-    } catch (const Sched::Exception &failure) {
-      std::cerr << "Failed to delete " << (*pool)->name << ": " << failure.what() << std::endl;
-    }
+bool create(const Loader::ResourcePoolImpl &pool, bool quiet) {
+  if (!pool.isEnabled) return false;
+  try {
+    Sched::createGroup(pool.name, pool.mem, pool.cpu);
+  } catch (const Sched::Exception &failure) {
+    if (failure.status != KNOB_STATUS_EXISTS) throw;
+    if (!quiet) Console::printError(pool.name, " exists; skipping.");
+    return false;
   }
+  return true;
 }
 
 void load(const Loader::PoolList &pools, bool quiet) {
-  Loader::PoolList created;
-  for (const auto &pool : pools) {
-    if (!pool->isEnabled) continue;
-    try {
-      Sched::createGroup(pool->name, pool->mem, pool->cpu);
-    } catch (const Sched::Exception &failure) {
-      if (failure.status != KNOB_STATUS_EXISTS) {
-        undo(created);
-        throw;
-      }
-      if (!quiet) std::cerr << pool->name << " exists; skipping." << std::endl;
-      continue;
-    }
-    created.push_back(pool);
-  }
+  const auto work = [quiet](const auto &pool) { return create(pool, quiet); };
+  const auto undo = [](const auto &pool) { Sched::deleteGroup(Sched::pathNameToId(pool.name)); };
+  Commands::runBatch(pools, {work, undo, "Failed to delete "});
 }
 
 }  // namespace
@@ -58,9 +48,10 @@ int cmdLoad(int argc, char **argv) {
       quiet = true;
       continue;
     }
-    std::cerr << kUsage;
+    Console::printUsage(kUsage);
     return option == 'h' ? 0 : 1;
   }
+  Commands::ignoreBrokenPipes();
   load(Loader::loadPools(operands(argc, argv), false), quiet);
   return 0;
 }

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// What getopt has left of a command line.
+// The operands of a command line.
 #pragma once
 
 #include <unistd.h>
@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-// The arguments behind the options, in their order. Valid once getopt has answered -1.
+// The arguments from getopt's optind on, in their order.
 inline std::vector<std::string> operands(int argc, char **argv) {
   return {argv + optind, argv + argc};
 }

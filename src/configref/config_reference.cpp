@@ -50,7 +50,7 @@ void readObjectMapping(const YAML::Node &node, ConfigStoreObjectId &id) {
   }
 }
 
-// Fields that the node does not give keep what they hold.
+// Parts of the id that the node does not name stay as they are.
 void readObject(const YAML::Node &node, ConfigStoreObjectId &id) {
   Yaml::requireValid(node);
   if (!node.IsDefined() || Yaml::isNull(node)) return;
@@ -106,8 +106,8 @@ std::optional<double> readField(const StoreObject &object, const char *field) {
   }
 }
 
-// Empty where the default holds: a store that fails is no reason for a host to go without its
-// pools. What is not the store's failure is reported at the reference.
+// Empty if the default is to be used. A failing store counts as one without the value, so that a
+// host gets its pools without it. Any other failure is an error with the place of the reference.
 std::optional<double> lookUp(const YAML::Node &node, const ConfigStoreObjectId &id,
                              const std::string &field) {
   try {

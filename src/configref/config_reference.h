@@ -6,7 +6,8 @@
 
 #include "calc/variable_table.h"
 
-// The stored value, or the default when the store has none or cannot be asked. Throw
-// Loader::Exception when the reference is malformed, and what the default's conversion throws.
+// The stored value, or the default if the store has no value or cannot be read. Throw
+// Loader::Exception if the reference is malformed, the yaml library's errors, and any exception
+// from the conversion of the default.
 float ConfigToFloat(const YAML::Node &node, const Calc::VariableTable &facts);
 bool ConfigToBool(const YAML::Node &node, const Calc::VariableTable &facts);

@@ -1,16 +1,17 @@
 // SPDX-License-Identifier: Apache-2.0
-// Finds the definition files, insists on their installed mark, and gathers their pools.
+// Reads all definition files into one sorted list of pools.
 #include "loader/definition_files.h"
 
 #include <dirent.h>
-#include <sys/xattr.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <exception>
 #include <system_error>
 
+#include "loader/definition_file.h"
 #include "loader/file_error.h"
+#include "yaml/exception.h"
 
 namespace Loader {
 namespace {
@@ -23,15 +24,78 @@ struct CloseFolder {
   throw std::system_error(errno, std::generic_category(), kDefinitionFolder);
 }
 
-// Newer yaml libraries add the path, which the file error names already.
+// More than any host has. Without bounds a small file with aliases could take all memory.
+constexpr size_t kMaxPools = 100000;
+constexpr size_t kMaxNameBytes = 64 * 1024 * 1024;
+
+// Newer releases of the yaml library add the path, which the file error contains anyway.
 std::string bareMessage(const YAML::Exception &error) {
   if (dynamic_cast<const YAML::BadFile *>(&error) != nullptr) return YAML::ErrorMsg::BAD_FILE;
   return error.msg;
 }
 
+// Runs BODY; what it throws becomes the nested cause of an error that names the file.
+template <typename Body>
+auto namingFile(const std::string &path, Body body) {
+  try {
+    return body();
+  } catch (const YAML::Exception &error) {
+    std::throw_with_nested(FileError(path, bareMessage(error), error.mark));
+  } catch (const std::exception &error) {
+    std::throw_with_nested(FileError(path, error.what(), YAML::Mark::null_mark()));
+  }
+}
+
+[[noreturn]] void throwNotInstalled(const std::string &path) {
+  throw FileError(path, "is not installed", YAML::Mark::null_mark());
+}
+
+// The pools of all files of a run.
+class Run {
+ public:
+  void readInstalled(const std::string &path) {
+    const char *const mark = installedMarkAt(path);
+    if (mark == nullptr) throwNotInstalled(path);
+    const auto file = namingFile(path, [&] { return std::make_unique<DefinitionFile>(path); });
+    if (!file->hasMark(mark)) throwNotInstalled(path);
+    namingFile(path, [&] { readPools(*file); });
+  }
+
+  void read(const std::string &path) {
+    namingFile(path, [&] {
+      DefinitionFile file(path);
+      readPools(file);
+    });
+  }
+
+  PoolList takePools() { return std::move(pools_); }
+
+ private:
+  void readPools(DefinitionFile &file) {
+    const YAML::Node document = file.read();
+    for (const auto &item : document) add(item);
+  }
+
+  void add(const YAML::Node &item) {
+    auto pool = std::make_shared<ResourcePoolImpl>(item);
+    nameBytes_ += pool->name.size();
+    if (pools_.size() == kMaxPools) {
+      throw Exception(item.Mark(), "more than " + std::to_string(kMaxPools) + " pools");
+    }
+    if (nameBytes_ > kMaxNameBytes) {
+      throw Exception(item.Mark(), "names of pools take more than 64 MB");
+    }
+    pools_.push_back(std::move(pool));
+  }
+
+  PoolList pools_;
+  size_t nameBytes_ = 0;
+};
+
 }  // namespace
 
-// The listing's own type counts: links, folders and entries of unknown type are no definitions.
+// An entry's type is the one in the listing. Symbolic links, folders and entries of unknown type
+// are skipped.
 std::vector<std::string> listDefinitionFolder() {
   const std::unique_ptr<DIR, CloseFolder> folder(opendir(kDefinitionFolder));
   if (!folder) throwFolderError();
@@ -48,35 +112,21 @@ std::vector<std::string> listDefinitionFolder() {
 }
 
 bool isInstalled(const std::string &path) {
-  for (const char *const mark : kInstalledMarks) {
-    char value = 0;
-    const ssize_t size = getxattr(path.c_str(), mark, &value, sizeof value);
-    if (size == 1) return value == 1;
-    if (size >= 0 || errno != ENOTSUP) return false;
-  }
-  return false;
+  return installedMarkAt(path) != nullptr;
 }
 
 PoolList readFile(const std::string &path) {
-  try {
-    PoolList pools;
-    const YAML::Node document = YAML::LoadFile(path);
-    for (const auto &item : document) pools.push_back(std::make_shared<ResourcePoolImpl>(item));
-    return pools;
-  } catch (const YAML::Exception &error) {
-    std::throw_with_nested(FileError(path, bareMessage(error), error.mark));
-  } catch (const std::exception &error) {
-    std::throw_with_nested(FileError(path, error.what(), YAML::Mark::null_mark()));
-  }
+  Run run;
+  run.read(path);
+  return run.takePools();
 }
 
 PoolList loadPools(const std::vector<std::string> &files, bool descending) {
-  PoolList pools;
+  Run run;
   for (const std::string &path : files.empty() ? listDefinitionFolder() : files) {
-    if (!isInstalled(path)) throw FileError(path, "is not installed", YAML::Mark::null_mark());
-    PoolList read = readFile(path);
-    std::move(read.begin(), read.end(), std::back_inserter(pools));
+    run.readInstalled(path);
   }
+  PoolList pools = run.takePools();
   std::sort(pools.begin(), pools.end(), [descending](const auto &a, const auto &b) {
     return descending ? b->name < a->name : a->name < b->name;
   });

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Makes every message that names a definition file.
+// The text of every error in a definition file.
 #include "loader/file_error.h"
 
 namespace Loader {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads four kernel records, each once in the process, and makes the variables of them.
+// Builds the variables from four kernel records, each of which is read once in the process.
 #include "loader/host_facts.h"
 
 #include <cstring>
@@ -21,7 +21,7 @@ Record readRecord(KNOB_NodeID node) {
   return record;
 }
 
-// A static of its own for each record: one that was read is not read again when another fails.
+// Each record is a static of its own: one that was read is not read again when another fails.
 const KNOB_CpuInfo &cpuInfo() {
   static const auto record = readRecord<KNOB_CpuInfo>(KNOB_NODE_hardware_cpu_cpuInfo);
   return record;
@@ -58,7 +58,7 @@ Calc::VariableTable readFacts() {
       {"isInstaller", isInstallerBoot(commandLine) ? 1.0F : 0.0F},
       {"isVm", static_cast<float>(cpu.isVm)},
       {"physKB", static_cast<float>(memory.physicalKB)},
-      // Flags of the kernel's build that are fixed, never asked for.
+      // Flags of the kernel's build. They are fixed and not read from the kernel.
       {"nucdefs.nux86_debug", 0.0F},
       {"nucdefs.GCOV_NUCLEUS", 0.0F},
   };

@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// Fills a pool record from a YAML mapping: defaults, keys in the order of the document, the name.
+// Fills a pool record from a YAML mapping: defaults, then the keys in the order of the document,
+// then the group path.
 #include "loader/resource_pool.h"
 
 #include <cstdint>
 #include <limits>
 
 #include "calc/tagged_value.h"
+#include "loader/group_path.h"
 #include "loader/host_facts.h"
 #include "yaml/exception.h"
 #include "yaml/node.h"
@@ -13,7 +15,7 @@
 namespace Loader {
 namespace {
 
-// Truncates toward zero. What the target cannot hold, and NaN, gives its most negative value.
+// Truncates toward zero. A value out of range, or NaN, gives the most negative value.
 template <typename Integer>
 Integer truncateTo(float value) {
   constexpr float kLowest = static_cast<float>(std::numeric_limits<Integer>::min());
@@ -21,40 +23,37 @@ Integer truncateTo(float value) {
   return std::numeric_limits<Integer>::min();
 }
 
-using Facts = Calc::VariableTable;
+// The pool that is filled, and the facts that its values may use.
+struct Reading {
+  ResourcePoolImpl &pool;
+  const Calc::VariableTable &facts;
 
-int64_t readMemory(const YAML::Node &value, const Facts &facts) {
-  return truncateTo<int64_t>(NodeToFloat(value, facts));
-}
-
-int32_t readCpu(const YAML::Node &value, const Facts &facts) {
-  return truncateTo<int32_t>(NodeToFloat(value, facts));
-}
+  int64_t memory(const YAML::Node &value) const {
+    return truncateTo<int64_t>(NodeToFloat(value, facts));
+  }
+  int32_t cpu(const YAML::Node &value) const {
+    return truncateTo<int32_t>(NodeToFloat(value, facts));
+  }
+  bool flag(const YAML::Node &value) const { return NodeToBool(value, facts); }
+};
 
 struct Field {
   const char *key;
-  void (*read)(ResourcePoolImpl &pool, const YAML::Node &value, const Facts &facts);
+  void (*read)(const Reading &to, const YAML::Node &value);
 };
 
-// There is no key for the CPU's minLimit: it always keeps its default.
+// There is no key for cpu.minLimit: it always keeps its default.
 constexpr Field kFields[] = {
-    {"name", [](auto &pool, auto &value, auto &) { pool.name = Yaml::scalarText(value); }},
-    {"mem", [](auto &pool, auto &value,
-               auto &facts) { pool.mem.min = pool.mem.max = readMemory(value, facts); }},
-    {"memMin",
-     [](auto &pool, auto &value, auto &facts) { pool.mem.min = readMemory(value, facts); }},
-    {"memMax",
-     [](auto &pool, auto &value, auto &facts) { pool.mem.max = readMemory(value, facts); }},
-    {"memMinLimit",
-     [](auto &pool, auto &value, auto &facts) { pool.mem.minLimit = readMemory(value, facts); }},
-    {"memShares",
-     [](auto &pool, auto &value, auto &facts) { pool.mem.shares = readMemory(value, facts); }},
-    {"cpuMin", [](auto &pool, auto &value, auto &facts) { pool.cpu.min = readCpu(value, facts); }},
-    {"cpuMax", [](auto &pool, auto &value, auto &facts) { pool.cpu.max = readCpu(value, facts); }},
-    {"cpuShares",
-     [](auto &pool, auto &value, auto &facts) { pool.cpu.shares = readCpu(value, facts); }},
-    {"isEnabled",
-     [](auto &pool, auto &value, auto &facts) { pool.isEnabled = NodeToBool(value, facts); }},
+    {"name", [](auto &to, auto &value) { to.pool.name = Yaml::scalarText(value); }},
+    {"mem", [](auto &to, auto &value) { to.pool.mem.min = to.pool.mem.max = to.memory(value); }},
+    {"memMin", [](auto &to, auto &value) { to.pool.mem.min = to.memory(value); }},
+    {"memMax", [](auto &to, auto &value) { to.pool.mem.max = to.memory(value); }},
+    {"memMinLimit", [](auto &to, auto &value) { to.pool.mem.minLimit = to.memory(value); }},
+    {"memShares", [](auto &to, auto &value) { to.pool.mem.shares = to.memory(value); }},
+    {"cpuMin", [](auto &to, auto &value) { to.pool.cpu.min = to.cpu(value); }},
+    {"cpuMax", [](auto &to, auto &value) { to.pool.cpu.max = to.cpu(value); }},
+    {"cpuShares", [](auto &to, auto &value) { to.pool.cpu.shares = to.cpu(value); }},
+    {"isEnabled", [](auto &to, auto &value) { to.pool.isEnabled = to.flag(value); }},
 };
 
 const Field *findField(const std::string &key) {
@@ -62,10 +61,6 @@ const Field *findField(const std::string &key) {
     if (key == field.key) return &field;
   }
   return nullptr;
-}
-
-std::string groupPath(const std::string &name) {
-  return name.compare(0, 5, "host/") == 0 ? name : "host/opt/" + name;
 }
 
 }  // namespace
@@ -76,7 +71,7 @@ std::vector<std::string> poolKeys() {
   return keys;
 }
 
-// A kernel whose facts cannot be read is reported before anything in the item.
+// Reads the facts first: if that fails, it is the error even when the item is invalid too.
 ResourcePoolImpl::ResourcePoolImpl(const YAML::Node &item) : ResourcePoolImpl(item, hostFacts()) {}
 
 ResourcePoolImpl::ResourcePoolImpl(const YAML::Node &item, const Calc::VariableTable &facts) {
@@ -90,7 +85,7 @@ ResourcePoolImpl::ResourcePoolImpl(const YAML::Node &item, const Calc::VariableT
   for (const auto &entry : item) {
     const Field *const field = findField(Yaml::scalarText(entry.first));
     if (field == nullptr) throw Exception(entry.first.Mark(), "invalid rp field");
-    field->read(*this, entry.second, facts);
+    field->read({*this, facts}, entry.second);
   }
   if (name.empty()) throw Exception(item.Mark(), "rp missing name");
   name = groupPath(name);

@@ -13,17 +13,18 @@
 
 namespace Loader {
 
-// Made whole or not at all, and read only from then on. No member is padded: the two records are
-// the packed ones that the kernel is given.
+// The constructor sets every member or throws. Commands read the members; unload also replaces mem
+// and cpu by the settings of the live group. The two records are the packed ones of the kernel's
+// interface, so there is no padding between the members.
 struct ResourcePoolImpl {
-  // Reads one item of a definition file, a mapping. Throws Loader::Exception at the node at
-  // fault, the yaml library's errors, and whatever the conversion of a value throws.
+  // Reads one item of a definition file, a mapping. Throws Loader::Exception with the place of the
+  // fault, the yaml library's errors, and any exception from the conversion of a value.
   explicit ResourcePoolImpl(const YAML::Node &item);
 
-  // The same with the facts of another machine; asks no kernel.
+  // The same with the facts of another machine, without a call to the kernel.
   ResourcePoolImpl(const YAML::Node &item, const Calc::VariableTable &facts);
 
-  std::string name;  // the full group path; begins with "host/"
+  std::string name;  // the path of the group; begins with "host/"
   bool isEnabled = true;
   Sched::MemAllocation mem;
   Sched::CpuAllocation cpu;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Makes every message of a failed scheduler-group operation.
+// The text of every failed scheduler-group operation.
 #include "sched/exception.h"
 
 #include "platform/knob.h"

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Turns typed operations on scheduler groups into exchanges over KNOB.
+// Implements the operations on scheduler groups as exchanges over KNOB.
 #include "sched/scheduler_group.h"
 
 #include <exception>
@@ -27,8 +27,11 @@ void addInt(const ParamList &list, int64_t value) {
   check(KNOB_ParamListAddInt(list.get(), value), "KNOB_ParamListAddInt");
 }
 
+// A text with a NUL would be cut there and name another group.
 void addString(const ParamList &list, const std::string &text) {
-  check(KNOB_ParamListAddString(list.get(), text.c_str()), "KNOB_ParamListAddString");
+  const bool whole = text.find('\0') == std::string::npos;
+  check(whole ? KNOB_ParamListAddString(list.get(), text.c_str()) : KNOB_STATUS_BAD_PARAMETER,
+        "KNOB_ParamListAddString");
 }
 
 void addSetting(const ParamList &list, const char *key, int64_t value) {
@@ -42,7 +45,7 @@ void getAllocation(KNOB_NodeID node, int64_t id, void *record, size_t size) {
   check(KNOB_Get(node, instance.get(), record, size), "KNOB_Get");
 }
 
-// The kernel's record holds shares before minLimit; they are sent the other way round.
+// The kernel's record has shares before minLimit; the settings are sent in the opposite order.
 template <typename Allocation>
 void setAllocation(KNOB_NodeID node, int64_t id, const Allocation &allocation) {
   const ParamList instance(ParamList::Kind::kInstance, 1);
@@ -61,7 +64,7 @@ struct SplitPath {
   std::string parent, name;
 };
 
-// Without a slash the parent is the empty path; what that means is for the kernel to say.
+// Without a slash the parent is the empty path, which the kernel accepts or refuses.
 SplitPath splitAtLastSlash(const std::string &path) {
   const size_t slash = path.rfind('/');
   if (slash == std::string::npos) return {"", path};

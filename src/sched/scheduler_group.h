@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// The kernel's scheduler groups. Each operation is one exchange with the kernel and throws
-// Sched::Exception, whose message begins with the interface call that failed.
+// The kernel's scheduler groups. Each operation is one exchange with the kernel, except
+// createGroup, and throws Sched::Exception, whose message begins with the interface call that
+// failed. A path that contains a NUL is a bad parameter.
 #pragma once
 
 #include <cstdint>
@@ -13,7 +14,7 @@ namespace Sched {
 // The id of the group of that path.
 int64_t pathNameToId(const std::string &path);
 
-// Fill *allocation with what the kernel says; untouched on failure.
+// Read the allocation of a group; *allocation is unchanged on failure.
 void getMemAllocation(int64_t id, MemAllocation *allocation);
 void getCpuAllocation(int64_t id, CpuAllocation *allocation);
 
@@ -23,8 +24,9 @@ void setCpuAllocation(int64_t id, const CpuAllocation &allocation);
 
 void deleteGroup(int64_t id);
 
-// Makes the group, whose parent must exist, with both allocations. When an allocation is refused
-// the group is deleted again and the refusal is nested in an exception that names the path.
+// Looks the parent up, creates the group and sets both allocations. If an allocation is refused,
+// the group is deleted again, and the refusal is nested in an exception that names the path. If
+// that deletion fails, its exception is thrown instead and the group stays.
 void createGroup(const std::string &path, const MemAllocation &mem, const CpuAllocation &cpu);
 
 }  // namespace Sched

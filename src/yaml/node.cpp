@@ -7,13 +7,14 @@
 namespace Yaml {
 namespace {
 
-// Older releases build the error from nothing, newer ones from the key that was asked for.
+// Older releases construct these errors without arguments, newer ones from a text: the requested
+// key, or the path of the file.
 template <typename Error>
-Error plainInvalidNode() {
+Error errorFrom(const std::string &text) {
   if constexpr (std::is_default_constructible_v<Error>) {
     return Error();
   } else {
-    return Error(std::string());
+    return Error(text);
   }
 }
 
@@ -21,8 +22,8 @@ bool isNullWord(const std::string &text) {
   return text == "~" || text == "null" || text == "Null" || text == "NULL";
 }
 
-// Newer releases keep a plain null word under a tag as a scalar, without a trace of whether it was
-// quoted. Older ones make it an untagged null, so that what they keep was quoted and is a text.
+// Newer releases report a null word after a tag as a scalar, quoted or not. Older ones report a
+// plain one as an untagged null, so that a tagged scalar was quoted and is a text.
 bool keepsTaggedNulls() {
   static const bool keeps = YAML::Load("!tag ~").IsScalar();
   return keeps;
@@ -36,7 +37,11 @@ bool hasExplicitTag(const YAML::Node &node) {
 }  // namespace
 
 void throwInvalidNode() {
-  throw plainInvalidNode<YAML::InvalidNode>();
+  throw errorFrom<YAML::InvalidNode>({});
+}
+
+void throwBadFile(const std::string &path) {
+  throw errorFrom<YAML::BadFile>(path);
 }
 
 void requireValid(const YAML::Node &node) {

@@ -80,18 +80,18 @@ TEST_F(Protection, APoolThatWasDisabledAndEnabledKeepsItsMinimumAgain) {
   EXPECT_GE(leftBesideGreedyNeighbour("host/opt/kept", "host/opt/greedy"), 0.95 * kMinimumMB);
 }
 
-// systemd mounts cgroup2 with it, the machine of these tests without.
+// systemd mounts cgroup2 with it, and so does the machine of these tests.
 TEST_F(Protection, AMinimumProtectsChildPoolsOnlyWithRecursiveProtection) {
   const auto remount = [](const char *option) {
     return mount("none", kMount.c_str(), "cgroup2", MS_REMOUNT, option);
   };
   ASSERT_TRUE(silentlyDone(load("- name: a\n  memMin: 64\n- name: a/b\n- name: greedy\n")));
-  EXPECT_LT(leftBesideGreedyNeighbour("host/opt/a/b", "host/opt/greedy"), 0.5 * kMinimumMB);
-  EXPECT_EQ(world.run("knobctl", {"check"}).status, 1);
-  ASSERT_EQ(remount("memory_recursiveprot"), 0);
   EXPECT_EQ(world.run("knobctl", {"check"}).status, 0);
   EXPECT_GE(leftBesideGreedyNeighbour("host/opt/a/b", "host/opt/greedy"), 0.95 * kMinimumMB);
-  EXPECT_EQ(remount(""), 0);
+  ASSERT_EQ(remount(""), 0);
+  EXPECT_EQ(world.run("knobctl", {"check"}).status, 1);
+  EXPECT_LT(leftBesideGreedyNeighbour("host/opt/a/b", "host/opt/greedy"), 0.5 * kMinimumMB);
+  EXPECT_EQ(remount("memory_recursiveprot"), 0);
 }
 
 // What Linux itself makes of some settings. A parent has memory of its own: the page cache of a

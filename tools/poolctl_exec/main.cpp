@@ -13,6 +13,7 @@
 #include <optional>
 #include <string>
 
+#include "loader/group_path.h"
 #include "pool_membership.h"
 #include "shared/version.h"
 
@@ -71,7 +72,7 @@ int run(int argc, char **argv) {
   }
 
   try {
-    Exec::joinGroup(Exec::groupPath(pool));
+    Exec::joinGroup(Loader::groupPath(pool));
     if (oomScoreAdj) Exec::setOomScoreAdj(*oomScoreAdj);
   } catch (const std::exception &error) {
     return complain(error.what(), kOwnFailure);

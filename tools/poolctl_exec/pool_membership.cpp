@@ -57,10 +57,6 @@ void refuseDisabled(const std::string &path) {
 
 }  // namespace
 
-std::string groupPath(const std::string &pool) {
-  return pool.compare(0, 5, "host/") == 0 ? pool : "host/opt/" + pool;
-}
-
 void joinGroup(const std::string &path) {
   const int64_t id = lookUp(path);
   const ParamList instance(ParamList::Kind::kInstance, 1);

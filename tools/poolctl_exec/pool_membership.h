@@ -6,10 +6,6 @@
 
 namespace Exec {
 
-// The path of a pool's group. As in definition files, a name that does not begin with "host/" is
-// below host/opt.
-std::string groupPath(const std::string &pool);
-
 // Moves the calling process into the group of that path; its later child processes start there. A
 // pool that is disabled, or is below a disabled one, is refused. Throws std::runtime_error, whose
 // what() names the group and the reason; the process has then not moved.

@@ -67,7 +67,7 @@ std::string textOf(const Deviation &deviation) {
 }
 
 void AllocationManager::add(const GroupPtr &group, Group &parent) {
-  writeRecord(group->fd(), Record());
+  writeFirstRecord(group->fd());
   UndoableWrites writes(tree_);
   cpu_.update(writes, group, {parent.id, 1, weightIn({})});
   writes.commit();

@@ -29,8 +29,12 @@ struct DirectoryCloser {
   void operator()(DIR *directory) const { (void)::closedir(directory); }
 };
 
+// Linux returns the whole of a control file in one read where the buffer is large enough. Only
+// cgroup.procs comes in parts.
+enum class Parts { kOne, kMany };
+
 // Reads to the end. Returns 0 or the errno.
-int readWhole(int file, std::string &text) {
+int readWhole(int file, Parts parts, std::string &text) {
   for (;;) {
     const size_t before = text.size();
     text.resize(before + kReadStep);
@@ -39,13 +43,14 @@ int readWhole(int file, std::string &text) {
     text.resize(before + static_cast<size_t>(count > 0 ? count : 0));
     if (count == 0) return 0;
     if (count < 0 && error != EINTR) return error;
+    if (count > 0 && static_cast<size_t>(count) < kReadStep && parts == Parts::kOne) return 0;
   }
 }
 
-int readInto(int directory, const char *name, std::string &text) {
+int readInto(int directory, const char *name, Parts parts, std::string &text) {
   const UniqueFd file(::openat(directory, name, O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
   if (!file) return errno;
-  const int error = readWhole(file.get(), text);
+  const int error = readWhole(file.get(), parts, text);
   if (!text.empty() && text.back() == '\n') text.pop_back();
   return error;
 }
@@ -114,17 +119,22 @@ int writeControl(int directory, const char *name, std::string_view text) {
   return file ? writeWhole(file.get(), text) : errno;
 }
 
-std::string readControl(int directory, const char *name) {
+// Throws KernelError.
+std::string readParts(int directory, const char *name, Parts parts) {
   std::string text;
-  if (const int error = readInto(directory, name, text); error != 0) {
+  if (const int error = readInto(directory, name, parts, text); error != 0) {
     fail(error, std::string("cannot read ") + name);
   }
   return text;
 }
 
+std::string readControl(int directory, const char *name) {
+  return readParts(directory, name, Parts::kOne);
+}
+
 std::optional<std::string> readControlIfAny(int directory, const char *name) {
   std::string text;
-  const int error = readInto(directory, name, text);
+  const int error = readInto(directory, name, Parts::kOne, text);
   if (error == ENOENT || error == ENODEV) return std::nullopt;
   if (error != 0) fail(error, std::string("cannot read ") + name);
   return text;
@@ -152,7 +162,7 @@ std::vector<Child> readChildren(int group) {
 }
 
 std::vector<int64_t> readMembers(int directory) {
-  return parseMembers(readControl(directory, kMembersFile));
+  return parseMembers(readParts(directory, kMembersFile, Parts::kMany));
 }
 
 std::vector<int64_t> parseMembers(std::string_view text) {
@@ -177,8 +187,9 @@ std::optional<std::string> readAttribute(int directory, const char *name) {
   fail(errno, std::string("cannot read the attribute ") + name);
 }
 
-void writeAttribute(int directory, const char *name, std::string_view value) {
-  if (::fsetxattr(directory, name, value.data(), value.size(), 0) == 0) return;
+void writeAttribute(int directory, const char *name, std::string_view value, Attribute kind) {
+  const int flags = kind == Attribute::kNew ? XATTR_CREATE : 0;
+  if (::fsetxattr(directory, name, value.data(), value.size(), flags) == 0) return;
   const int error = errno;
   if (error == EOPNOTSUPP) {
     fail(Status::kKernelNotUsable, error,

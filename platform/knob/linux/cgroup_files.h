@@ -81,8 +81,10 @@ std::vector<int64_t> parseMembers(std::string_view text);
 // An extended attribute of the directory; nothing when it has none. Throws KernelError.
 std::optional<std::string> readAttribute(int directory, const char *name);
 
-// Throw KernelError.
-void writeAttribute(int directory, const char *name, std::string_view value);
+// Throw KernelError; for kNew: exists, when the directory has the attribute already.
+enum class Attribute { kAny, kNew };
+void writeAttribute(int directory, const char *name, std::string_view value,
+                    Attribute kind = Attribute::kAny);
 void removeAttribute(int directory, const char *name);
 
 }  // namespace Knob::Linux

@@ -5,6 +5,7 @@
 #include "knob/linux/fixed_groups.h"
 
 #include "knob/linux/cgroup_files.h"
+#include "knob/linux/record.h"
 #include "knob/names.h"
 #include "knob/signature.h"
 
@@ -32,8 +33,10 @@ std::string optPath() {
 GroupPtr makeIfMissing(CgroupTree &tree, Group *parent, const std::string &path) {
   if (GroupPtr group = tree.lookUp(path)) return group;
   try {
-    if (parent == nullptr) return tree.makeHost();
-    return tree.make(*parent, kFixedChildName);
+    const GroupPtr group =
+        parent == nullptr ? tree.makeHost() : tree.make(*parent, kFixedChildName);
+    writeFirstRecord(group->fd());
+    return group;
   } catch (const KernelError &error) {
     if (error.status != Status::kExists) throw;
   }

@@ -64,4 +64,8 @@ std::optional<Record> decode(std::string_view bytes);
 StoredRecord readRecord(int directory);
 void writeRecord(int directory, const Record &record);
 
+// Writes the record of a new group, unless another process has written one already. Throws
+// KernelError.
+void writeFirstRecord(int directory);
+
 }  // namespace Knob::Linux

@@ -4,6 +4,7 @@
 // only when the program sleeps; a sleep takes no time. The file that HOST_CALLS_UNREADABLE names
 // cannot be opened, not even by root. Records the size of what is flushed to standard output.
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <stdio_ext.h>
 #include <syslog.h>
 #include <time.h>
@@ -56,13 +57,23 @@ void logged(int priority, const char *format, va_list arguments) {
   next<void(int, const char *, ...)>("syslog")(priority, "%s", text);
 }
 
-FILE *opened(const char *function, const char *path, const char *mode) {
+// Whether the script makes this file unreadable; sets errno then.
+bool isUnreadable(const char *path) {
   const char *unreadable = getenv("HOST_CALLS_UNREADABLE");
-  if (unreadable != nullptr && strcmp(path, unreadable) == 0) {
-    errno = EACCES;
-    return nullptr;
-  }
+  if (unreadable == nullptr || strcmp(path, unreadable) != 0) return false;
+  errno = EACCES;
+  return true;
+}
+
+FILE *opened(const char *function, const char *path, const char *mode) {
+  if (isUnreadable(path)) return nullptr;
   return next<FILE *(const char *, const char *)>(function)(path, mode);
+}
+
+int opened(const char *function, const char *path, int flags, va_list arguments) {
+  if (isUnreadable(path)) return -1;
+  const mode_t mode = (flags & (O_CREAT | O_TMPFILE)) == 0 ? 0 : va_arg(arguments, mode_t);
+  return next<int(const char *, int, ...)>(function)(path, flags, mode);
 }
 
 }  // namespace
@@ -136,7 +147,21 @@ FILE *fopen(const char *path, const char *mode) {
   return opened("fopen", path, mode);
 }
 
-// The C++ library's file streams use it.
+int open(const char *path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const int result = opened("open", path, flags, arguments);
+  va_end(arguments);
+  return result;
+}
+
+// What open is called in a program that was built with _FORTIFY_SOURCE.
+int __open_2(const char *path, int flags) {
+  if (isUnreadable(path)) return -1;
+  return next<int(const char *, int)>("__open_2")(path, flags);
+}
+
+// The C++ library\'s file streams use it.
 FILE *fopen64(const char *path, const char *mode) {
   return opened("fopen64", path, mode);
 }

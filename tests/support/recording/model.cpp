@@ -55,6 +55,8 @@ Rule readRule(std::istringstream &words) {
       rule.node = value;
     } else if (key == "group") {
       rule.group = value;
+    } else if (key == "signal") {
+      rule.signal = static_cast<int>(number(value));
     } else if (key == "status") {
       rule.status = static_cast<uint32_t>(number(value));
     } else if (key == "from") {
@@ -103,7 +105,7 @@ void Model::read(std::istream &script) {
       Group group = readGroup(words);
       group.id = scriptedId++;
       groups.push_back(group);
-    } else if (word == "fail") {
+    } else if (word == "fail" || word == "send") {
       rules.push_back(readRule(words));
     } else if (word == "cpus") {
       words >> cpus;

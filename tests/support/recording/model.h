@@ -30,13 +30,15 @@ struct Group {
   int emptiesAfter = -1;  // its child groups vanish after so many listings; -1: never
 };
 
-// A rule of the script: the calls that match it fail. An empty field matches everything.
+// A rule of the script: the calls that match it fail, or send the program a signal. An empty text
+// matches everything.
 struct Rule {
   std::string function, node, group;
-  uint32_t status = 0;
-  int from = 1;   // the first matching call that fails
-  int count = 1;  // how many then fail; 0: all
-  int seen = 0;   // matching calls so far
+  uint32_t status = 0;  // 0: the call does not fail
+  int signal = 0;       // sent before the call is answered; 0: none
+  int from = 1;         // the first matching call
+  int count = 1;        // how many follow it, itself included; 0: all
+  int seen = 0;         // matching calls so far
 
   bool strikes(const std::string &calledFunction, const std::string &calledNode,
                const std::string &calledGroup);

@@ -4,6 +4,9 @@
 // folder describes its files.
 #include "recording_knob.h"
 
+#include <signal.h>
+#include <unistd.h>
+
 #include <algorithm>
 #include <cstring>
 #include <fstream>
@@ -100,12 +103,17 @@ std::string result(uint32_t status, bool injected) {
   return " -> " + text + (injected ? " (injected)" : "");
 }
 
-// The rule's status, or 0 when no rule strikes this call. Every rule counts it.
+// The status of the first rule that matches this call with one, or 0. Every rule counts the call,
+// and sends its signal.
 uint32_t injected(const char *function, const std::string &node = {},
                   const std::string &group = {}) {
   uint32_t status = 0;
-  for (Recording::Rule &rule : state().model.rules)
-    if (rule.strikes(function, node, group) && status == 0) status = rule.status;
+  for (Recording::Rule &rule : state().model.rules) {
+    if (rule.strikes(function, node, group)) {
+      if (rule.signal != 0) kill(getpid(), rule.signal);
+      if (status == 0) status = rule.status;
+    }
+  }
   return status;
 }
 

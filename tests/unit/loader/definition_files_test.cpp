@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <filesystem>
 #include <ios>
 #include <stdexcept>
@@ -304,6 +305,58 @@ TEST_F(DefinitionFile, ThatCannotBeReadIsABadFile) {
     EXPECT_EQ(path + ": bad file", error.what());
     EXPECT_THROW(std::rethrow_if_nested(error), YAML::BadFile);
   }
+}
+
+// ---- bounds
+
+class DefinitionBounds : public DefinitionFile {
+ protected:
+  static std::string pools(size_t count) {
+    std::string content;
+    for (size_t i = 0; i < count; ++i) content += "- {name: a}\n";
+    return content;
+  }
+
+  // A file of that size, most of it NULs.
+  std::string fileOf(std::uintmax_t bytes) {
+    const std::string path = installed("large", "- {name: a}\n");
+    std::filesystem::resize_file(path, bytes);
+    return path;
+  }
+};
+
+TEST_F(DefinitionBounds, SixtyFourMegabytesAreTheMost) {
+  constexpr std::uintmax_t kMax = 64 << 20;
+  const std::string message = "file is larger than 64 MB";
+  try {
+    loadPools({fileOf(kMax)}, false);
+  } catch (const FileError &error) {
+    EXPECT_EQ(std::string::npos, std::string(error.what()).find(message)) << error.what();
+  }
+  expectFailure<Loader::Exception>(fileOf(kMax + 1), message);
+  EXPECT_THROW(Loader::readFile(fileOf(kMax + 1)), FileError);
+}
+
+TEST_F(DefinitionBounds, OneHundredThousandPoolsInAllFilesAreTheMost) {
+  const std::string half = installed("half", pools(50000));
+  EXPECT_EQ(100000u, loadPools({half, half}, false).size());
+  const std::string more = installed("more", "\n- {name: a}\n");
+  try {
+    loadPools({half, half, more}, false);
+    FAIL() << "a pool too many";
+  } catch (const FileError &error) {
+    EXPECT_EQ(more + ": line 2 column 3: more than 100000 pools", error.what());
+  }
+}
+
+// By aliases a small file would take as much memory as it has pools, times the length of a name.
+TEST_F(DefinitionBounds, NamesOfSixtyFourMegabytesAreTheMost) {
+  const size_t prefix = std::string("host/opt/").size();
+  std::string content = "- name: &n " + std::string((1 << 20) - prefix, 'n') + "\n";
+  for (int i = 1; i < 64; ++i) content += "- name: *n\n";
+  EXPECT_EQ(64u, loadPools({installed("names", content)}, false).size());
+  expectFailure<Loader::Exception>(installed("names", content + "- name: b\n"),
+                                   "line 65 column 3: names of pools take more than 64 MB");
 }
 
 // ---- the lookup

@@ -2,10 +2,12 @@
 // How the installed mark is asked for, call by call, and what each answer of the system means. The
 // system's function is this program's own here.
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <sys/xattr.h>
 
 #include <cerrno>
 #include <cstring>
+#include <functional>
 #include <map>
 #include <string>
 #include <vector>
@@ -30,17 +32,37 @@ struct Asked {
 std::map<std::string, Answer> answers;
 std::vector<Asked> asked;
 
+// What the system answers for the opened file, where that differs.
+std::map<std::string, Answer> answersByDescriptor;
+
+// Called once, after the mark of a path was read.
+std::function<void()> afterPath;
+
 }  // namespace
+
+static ssize_t answer(const std::map<std::string, Answer> &answers, const char *name, void *value,
+                      size_t size) {
+  const auto found = answers.find(name);
+  const Answer given = found == answers.end() ? Answer{ENOTSUP, ""} : found->second;
+  errno = given.error;
+  if (given.error == 0 && size < given.value.size()) errno = ERANGE;
+  if (errno != 0) return -1;
+  std::memcpy(value, given.value.data(), given.value.size());
+  return static_cast<ssize_t>(given.value.size());
+}
 
 extern "C" ssize_t getxattr(const char *path, const char *name, void *value, size_t size) noexcept {
   asked.push_back({path, name, size});
-  const auto found = answers.find(name);
-  const Answer answer = found == answers.end() ? Answer{ENOTSUP, ""} : found->second;
-  errno = answer.error;
-  if (answer.error == 0 && size < answer.value.size()) errno = ERANGE;
-  if (errno != 0) return -1;
-  std::memcpy(value, answer.value.data(), answer.value.size());
-  return static_cast<ssize_t>(answer.value.size());
+  const ssize_t result = answer(answers, name, value, size);
+  const int error = errno;
+  if (result > 0 && afterPath) afterPath();
+  errno = error;
+  return result;
+}
+
+extern "C" ssize_t fgetxattr(int, const char *name, void *value, size_t size) noexcept {
+  const bool differs = answersByDescriptor.count(name) != 0;
+  return answer(differs ? answersByDescriptor : answers, name, value, size);
 }
 
 namespace {
@@ -52,7 +74,9 @@ class InstalledMark : public testing::Test {
  protected:
   InstalledMark() {
     answers.clear();
+    answersByDescriptor.clear();
     asked.clear();
+    afterPath = nullptr;
     ::Test::writeFile(path_, "- name: a\n");
   }
 
@@ -148,6 +172,55 @@ TEST_F(InstalledMark, IsAskedForFileByFile) {
   ASSERT_EQ(2u, asked.size());
   EXPECT_EQ(path_, asked[0].path);
   EXPECT_EQ(bad, asked[1].path);
+}
+
+// ---- another process replaces the file after its mark was read
+
+class ReplacedFile : public InstalledMark {
+ protected:
+  // Puts OTHER in the place of the file at that moment.
+  void replaceBy(const std::string &other) {
+    afterPath = [this, other] { ASSERT_EQ(0, rename(other.c_str(), path_.c_str())); };
+  }
+  const std::string other_ = folder_.path() / "other";
+};
+
+TEST_F(ReplacedFile, IsNotInstalledWithoutAMarkOfItsOwn) {
+  for (const int error : {ENODATA, ENOTSUP, EPERM, EACCES}) {
+    answers = {{kUser, {0, "\x01"}}};
+    answersByDescriptor = {{kUser, {error, ""}}};
+    ::Test::writeFile(other_, "- name: b\n");
+    replaceBy(other_);
+    EXPECT_FALSE(installed()) << std::strerror(error);
+  }
+}
+
+TEST_F(ReplacedFile, WithAMarkOfItsOwnIsRead) {
+  answers = {{kPlain, {0, "\x01"}}};
+  ::Test::writeFile(other_, "- name: b\n");
+  replaceBy(other_);
+  EXPECT_EQ("host/opt/b", Loader::loadPools({path_}, false).at(0)->name);
+}
+
+TEST_F(ReplacedFile, ByAFifoIsABadFileAndNoHang) {
+  answers = {{kPlain, {0, "\x01"}}};
+  ASSERT_EQ(0, mkfifo(other_.c_str(), 0600));
+  replaceBy(other_);
+  try {
+    Loader::loadPools({path_}, false);
+    FAIL() << "a FIFO was read";
+  } catch (const Loader::FileError &error) {
+    EXPECT_EQ(path_ + ": bad file", error.what());
+  }
+}
+
+// Not on Linux, which has no attribute of that name.
+TEST_F(ReplacedFile, PlainNameThatOnlyPathsHaveIsEnough) {
+  answers = {{kPlain, {0, "\x01"}}};
+  answersByDescriptor = {{kPlain, {ENOTSUP, ""}}};
+  EXPECT_TRUE(installed());
+  answersByDescriptor = {{kPlain, {ENODATA, ""}}};
+  EXPECT_FALSE(installed());
 }
 
 }  // namespace
