@@ -1,9 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
-// Reads the `key = value` form. What a key means is its reader's business.
+// Reads the `key = value` form. The caller interprets keys and values.
 #include "common/key_value_file.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <system_error>
 
 #include "common/number.h"
@@ -60,9 +59,9 @@ std::optional<KeyValueFile> KeyValueFile::read(const std::string &fileName,
                                                std::initializer_list<std::string_view> knownKeys) {
   std::string text;
   try {
-    text = readFile(fileName, kMaxBytes);
+    text = readRegularFile(fileName, kMaxBytes);
   } catch (const std::system_error &error) {
-    if (error.code().value() == ENOENT) return std::nullopt;
+    if (error.code() == std::errc::no_such_file_or_directory) return std::nullopt;
     throw ConfigError(fileName + ": " + error.code().message());
   }
   return parse(text, fileName, knownKeys);

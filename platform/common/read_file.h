@@ -11,4 +11,8 @@ namespace Platform {
 // path; a larger file is EFBIG.
 std::string readFile(const std::string &path, size_t maxBytes);
 
+// The same for a path that comes from a user or the environment: refuses what is not a regular
+// file, and never waits for the writer of a FIFO.
+std::string readRegularFile(const std::string &path, size_t maxBytes);
+
 }  // namespace Platform

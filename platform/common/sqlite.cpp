@@ -76,7 +76,9 @@ void Database::execute(const char *sql) {
 }
 
 void Database::fail(int resultCode) const {
-  if ((resultCode & 0xff) == SQLITE_NOMEM) throw std::bad_alloc();
+  if ((resultCode & 0xff) == SQLITE_NOMEM || resultCode == SQLITE_IOERR_NOMEM) {
+    throw std::bad_alloc();
+  }
   throw SqliteError(resultCode, handle_ ? sqliteLibrary().errmsg(handle_.get())
                                         : sqliteLibrary().errstr(resultCode));
 }
@@ -136,15 +138,11 @@ void Query::check(int resultCode) const {
 Transaction::Transaction(TransactionStatements &statements, Kind kind) : statements_(statements) {
   (void)statements.rollback.get();
   (void)statements.commit.get();
-  rollBack();  // one that could not be rolled back before
   Query(kind == Kind::kRead ? statements.read : statements.write).finish();
 }
 
 Transaction::~Transaction() {
-  if (open_) rollBack();
-}
-
-void Transaction::rollBack() noexcept {
+  if (!open_) return;
   // Some failures have rolled back already.
   if (sqliteLibrary().get_autocommit(statements_.rollback.database().get()) != 0) return;
   (void)sqliteLibrary().step(statements_.rollback.get());

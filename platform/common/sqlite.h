@@ -153,8 +153,6 @@ class Transaction {
   void commit();
 
  private:
-  void rollBack() noexcept;
-
   TransactionStatements &statements_;
   bool open_ = true;
 };

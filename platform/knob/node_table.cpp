@@ -125,6 +125,7 @@ constexpr bool hasNumberTwice() {
   }
   return false;
 }
+
 static_assert(!hasNumberTwice());
 
 const Node &nodeOf(KNOB_NodeID id) {

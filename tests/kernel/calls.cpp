@@ -96,7 +96,7 @@ Answer<Settings> cpu(int64_t id) {
 
 namespace {
 
-// The interface counts the entries of a list that it hands out; what they are, it tells nobody.
+// The interface counts the entries of a list that it hands out, and does not show them.
 Answer<int> countInstances(KNOB_NodeID node, int64_t id) {
   KNOB_ParamList *result = nullptr;
   const auto status = KNOB_GetInstanceListAlloc(node, instance(id).get(), &result);

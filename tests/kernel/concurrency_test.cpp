@@ -15,7 +15,7 @@ namespace {
 
 constexpr int kProcesses = 4;
 
-// A process that ends with what its work answers: 0 where all went well.
+// A process whose exit status is what its work returns: 0 for success.
 pid_t startProcess(const std::function<int()> &work) {
   const pid_t pid = ::fork();
   if (pid == 0) ::_exit(work());
@@ -167,7 +167,7 @@ TEST_F(Crash, AKilledProcessLeavesATreeThatTheNextOneCanUse) {
     ASSERT_EQ(made.status, kSuccess) << round;
     EXPECT_EQ(setMemory(made.value, {"min=1"}), kSuccess);
     EXPECT_EQ(remove(made.value), kSuccess);
-    // Too much may stay reserved, which the check mends; after that there is nothing to find.
+    // Too much may stay reserved, which the check repairs; after that it finds nothing.
     (void)kernelUnderTest().check(true);
     EXPECT_TRUE(kernelUnderTest().check(false).empty()) << round;
   }

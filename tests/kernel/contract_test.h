@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The frame of every case of the contract: a kernel started anew, with a group of the case's own.
+// The fixture of every case of the contract: a newly started kernel, with a group for the case.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -13,7 +13,7 @@ class ContractTest : public testing::Test {
  protected:
   ContractTest() { kernelUnderTest().startAnew(); }
 
-  // What every case must leave: books that agree with the tree.
+  // What every case must leave: records that agree with the tree.
   void TearDown() override { EXPECT_TRUE(kernelUnderTest().check(false).empty()); }
 };
 

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A process that lives, and holds what memory it is told to, until the case lets it go.
+// A process that lives and holds as much memory as ordered, until the case ends it.
 #pragma once
 
 #include <sys/types.h>

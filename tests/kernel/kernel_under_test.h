@@ -21,7 +21,7 @@ class KernelUnderTest {
   // kMemoryMB and kCpus that is a virtual one.
   virtual void startAnew() = 0;
 
-  // What the kernel's own check finds, a line each; repair: mends it.
+  // The findings of the kernel's own check, one a line; repair: repairs them.
   virtual std::vector<std::string> check(bool repair) = 0;
 };
 

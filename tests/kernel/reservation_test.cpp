@@ -158,7 +158,7 @@ TEST_P(Reservation, AMaxReservesNothing) {
   EXPECT_EQ(setMin(second_, machine()), kSuccess);
 }
 
-// Random changes, against books kept by counting everything anew each time.
+// Random changes, compared with a model that counts everything again each time.
 TEST_P(Reservation, AgreesWithACountOfTheWholeTreeAfterRandomChanges) {
   struct Group {
     int64_t id;

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // What a memory minimum is worth when the whole machine is out of memory and the kernel kills: a
-// storm of at least fifty kills, under hogs of five kinds, on user-mode Linux and in QEMU.
+// storm of at least fifty kills, under hogs of five kinds.
 #include <gtest/gtest.h>
 #include <unistd.h>
 

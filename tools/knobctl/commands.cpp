@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Thin: a sub-command reads its words, makes one call of the kernel and prints the answer. What the
-// kernel allows is the kernel's business.
+// Thin: a sub-command reads its options, makes one call of the kernel and prints the result. The
+// kernel decides what is allowed.
 #include "knobctl/commands.h"
 
 #include <unistd.h>
@@ -13,6 +13,7 @@
 
 #include "knobctl/kernel_access.h"
 #include "knobctl/kernel_report.h"
+#include "knobctl/set.h"
 #include "knobctl/start.h"
 #include "knobctl/tree.h"
 #include "shared/command_table.h"
@@ -29,11 +30,12 @@ using Tools::printable;
 
 constexpr size_t kLabelColumns = 26;
 
-struct Words {
+struct Options {
   std::string path = "host";
   int64_t pid = 0;
   bool repair = false;
-  BootWords boot;
+  BootOptions boot;
+  SetOptions set;
 };
 
 void printLine(const std::string &label, const std::string &text) {
@@ -51,36 +53,23 @@ Look look() {
   return colour ? Look::kColour : Look::kPlain;
 }
 
-ExitStatus boot(const Words &words) {
-  bootKernel(words.boot);
+ExitStatus boot(const Options &options) {
+  bootKernel(options.boot);
   return Tools::kExitSuccess;
 }
 
-ExitStatus status(const Words &) {
+ExitStatus status(const Options &) {
   const KernelReport report = reportOnKernel();
   for (const auto &[label, text] : report.lines) printLine(label, text);
   if (!report.problem.empty()) throw Tools::Failure(Tools::kExitFailure, report.problem);
   return Tools::kExitSuccess;
 }
 
-ExitStatus tree(const Words &words) {
-  onKernel("tree " + words.path, [&](Kernel &kernel) {
-    std::cout << layOutTree(collectTree(kernel, words.path), kernel.facts(), look());
+ExitStatus tree(const Options &options) {
+  onKernel("tree " + options.path, [&](Kernel &kernel) {
+    std::cout << layOutTree(collectTree(kernel, options.path), kernel.facts(), look());
   });
   return Tools::kExitSuccess;
-}
-
-std::string shares(int64_t value) {
-  switch (value) {
-    case -2:
-      return "low";
-    case -3:
-      return "normal";
-    case -4:
-      return "high";
-    default:
-      return std::to_string(value);
-  }
 }
 
 std::string limit(int64_t value) {
@@ -92,7 +81,7 @@ void printAllocation(const std::string &name, const std::string &unit,
   printLine(name + " min " + unit, allocation.min);
   printLine(name + " max " + unit, limit(allocation.max));
   printLine(name + " minLimit " + unit, limit(allocation.minLimit));
-  printLine(name + " shares", shares(allocation.shares));
+  printLine(name + " shares", sharesText(allocation.shares));
   printLine(name + " reservation " + unit, reservation);
 }
 
@@ -101,12 +90,12 @@ void printUsage(const Knob::GroupUsage &usage) {
   if (usage.cpuMicroseconds) printLine("CPU used us", std::to_string(*usage.cpuMicroseconds));
 }
 
-ExitStatus stats(const Words &words) {
-  onKernel("stats " + words.path, [&](Kernel &kernel) {
-    const GroupId id = kernel.lookUp(words.path);
+ExitStatus stats(const Options &options) {
+  onKernel("stats " + options.path, [&](Kernel &kernel) {
+    const GroupId id = kernel.lookUp(options.path);
     const Knob::GroupView view = kernel.view(id);
     const Knob::MemoryStatistics peaks = kernel.memoryStatistics(id);
-    printLine("group", words.path);
+    printLine("group", options.path);
     printLine("id", id);
     printAllocation("memory", "MB", view.memory, view.memoryReservationMB);
     printLine("memory own peak KB", std::to_string(peaks.ownReservedPeakKB));
@@ -118,7 +107,7 @@ ExitStatus stats(const Words &words) {
   return Tools::kExitSuccess;
 }
 
-ExitStatus facts(const Words &) {
+ExitStatus facts(const Options &) {
   const Knob::HostFacts facts = onKernel("facts", [](Kernel &kernel) { return kernel.facts(); });
   printLine("CPUs", int64_t{facts.cpus});
   printLine("memory KB", std::to_string(facts.memoryKB));
@@ -128,10 +117,10 @@ ExitStatus facts(const Words &) {
   return Tools::kExitSuccess;
 }
 
-// What was found and repaired is no failure; what is left is.
-ExitStatus check(const Words &words) {
+// A finding that was repaired is not a failure.
+ExitStatus check(const Options &options) {
   const auto findings =
-      onKernel("check", [&](Kernel &kernel) { return kernel.check(words.repair); });
+      onKernel("check", [&](Kernel &kernel) { return kernel.check(options.repair); });
   ExitStatus result = Tools::kExitSuccess;
   for (const Knob::Finding &finding : findings) {
     std::cout << printable(finding.path) << ": " << printable(finding.text)
@@ -142,45 +131,57 @@ ExitStatus check(const Words &words) {
   return result;
 }
 
-ExitStatus create(const Words &words) {
-  onKernel("create " + words.path, [&](Kernel &kernel) {
-    const size_t slash = words.path.rfind('/');
+ExitStatus create(const Options &options) {
+  onKernel("create " + options.path, [&](Kernel &kernel) {
+    const size_t slash = options.path.rfind('/');
     if (slash == std::string::npos) {
       throw Knob::KernelError(Knob::Status::kBadParameter, "a path begins with host/");
     }
-    (void)kernel.create(kernel.lookUp(words.path.substr(0, slash)), words.path.substr(slash + 1));
+    (void)kernel.create(kernel.lookUp(options.path.substr(0, slash)),
+                        options.path.substr(slash + 1));
   });
   return Tools::kExitSuccess;
 }
 
-ExitStatus remove(const Words &words) {
-  onKernel("delete " + words.path,
-           [&](Kernel &kernel) { kernel.remove(kernel.lookUp(words.path)); });
+ExitStatus set(const Options &options) {
+  setAllocations(options.path, options.set);
   return Tools::kExitSuccess;
 }
 
-ExitStatus join(const Words &words) {
-  onKernel("join " + words.path + " " + std::to_string(words.pid),
-           [&](Kernel &kernel) { kernel.join(kernel.lookUp(words.path), words.pid); });
+ExitStatus remove(const Options &options) {
+  onKernel("delete " + options.path,
+           [&](Kernel &kernel) { kernel.remove(kernel.lookUp(options.path)); });
   return Tools::kExitSuccess;
 }
 
-void noWords(CLI::App &, Words *) {}
-
-void bootWords(CLI::App &command, Words *words) {
-  declareBootWords(command, &words->boot);
+ExitStatus join(const Options &options) {
+  onKernel("join " + options.path + " " + std::to_string(options.pid),
+           [&](Kernel &kernel) { kernel.join(kernel.lookUp(options.path), options.pid); });
+  return Tools::kExitSuccess;
 }
 
-void pathWord(CLI::App &command, Words *words) {
-  command.add_option("PATH", words->path, "Path of the group, such as host/opt/backup")->required();
+void noOptions(CLI::App &, Options *) {}
+
+void bootOptions(CLI::App &command, Options *options) {
+  declareBootOptions(command, &options->boot);
 }
 
-void treeWords(CLI::App &command, Words *words) {
-  command.add_option("PATH", words->path, "Only this group and what is below it");
+void pathOption(CLI::App &command, Options *options) {
+  command.add_option("PATH", options->path, "Path of the group, such as host/opt/backup")
+      ->required();
 }
 
-void checkWords(CLI::App &command, Words *words) {
-  command.add_flag("--repair", words->repair, "Mend what is wrong");
+void setOptions(CLI::App &command, Options *options) {
+  pathOption(command, options);
+  declareSetOptions(command, &options->set);
+}
+
+void treeOptions(CLI::App &command, Options *options) {
+  command.add_option("PATH", options->path, "Only this group and what is below it");
+}
+
+void checkOptions(CLI::App &command, Options *options) {
+  command.add_flag("--repair", options->repair, "Repair what is wrong");
 }
 
 // The parser alone would take the largest number for one that is larger still.
@@ -190,25 +191,27 @@ bool isProcessNumber(const std::string &text) {
          text.find_first_not_of('0') != std::string::npos;
 }
 
-void joinWords(CLI::App &command, Words *words) {
-  pathWord(command, words);
-  command.add_option("PID", words->pid, "Number of the process")
+void joinOptions(CLI::App &command, Options *options) {
+  pathOption(command, options);
+  command.add_option("PID", options->pid, "Number of the process")
       ->required()
       ->check([](const std::string &text) {
-        return isProcessNumber(text) ? "" : "\"" + printable(text) + "\" is no process's number";
+        return isProcessNumber(text) ? ""
+                                     : "\"" + printable(text) + "\" is not the number of a process";
       });
 }
 
-constexpr std::array<Tools::Command<Words>, 9> kCommands = {{
-    {"boot", "Starts the emulated kernel anew, without groups", bootWords, boot},
-    {"status", "Tells which kernel this is and whether it can be used", noWords, status},
-    {"tree", "Prints the groups with their memory and CPU", treeWords, tree},
-    {"stats", "Prints all that is known of one group", pathWord, stats},
-    {"facts", "Prints what the kernel knows of the machine", noWords, facts},
-    {"check", "Recounts what the kernel keeps", checkWords, check},
-    {"create", "Makes a group", pathWord, create},
-    {"delete", "Deletes a group", pathWord, remove},
-    {"join", "Puts a process in a group", joinWords, join},
+constexpr std::array<Tools::Command<Options>, 10> kCommands = {{
+    {"boot", "Restarts the emulated kernel without groups", bootOptions, boot},
+    {"status", "Prints which kernel is configured and whether it can be used", noOptions, status},
+    {"tree", "Prints the groups with their memory and CPU", treeOptions, tree},
+    {"stats", "Prints everything about one group", pathOption, stats},
+    {"facts", "Prints the facts of the machine", noOptions, facts},
+    {"check", "Checks the reservations that the kernel keeps", checkOptions, check},
+    {"create", "Makes a group", pathOption, create},
+    {"set", "Sets memory and CPU of a group", setOptions, set},
+    {"delete", "Deletes a group", pathOption, remove},
+    {"join", "Moves a process into a group", joinOptions, join},
 }};
 
 }  // namespace

@@ -16,7 +16,7 @@ Tools::Failure failure(const std::string &what, const Knob::KernelError &error);
 
 // Calls OPERATION, and throws the Failure of what the kernel refuses.
 template <typename Operation>
-auto withWords(const std::string &what, const Operation &operation) {
+auto reporting(const std::string &what, const Operation &operation) {
   try {
     return operation();
   } catch (const Knob::KernelError &error) {
@@ -27,7 +27,7 @@ auto withWords(const std::string &what, const Operation &operation) {
 // The same with the configured kernel: calls OPERATION(Kernel &).
 template <typename Operation>
 auto onKernel(const std::string &what, const Operation &operation) {
-  return withWords(what, [&] {
+  return reporting(what, [&] {
     const auto kernel = Knob::openConfiguredKernel();
     return operation(*kernel);
   });

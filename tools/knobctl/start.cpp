@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The words of `knobctl boot` and the facts that they stand for.
+// The options of `knobctl boot`, and the facts that they set.
 #include "knobctl/start.h"
 
 #include "knob/emulated/boot.h"
@@ -8,31 +8,31 @@
 
 namespace Knobctl {
 
-void declareBootWords(CLI::App &command, BootWords *words) {
-  command.add_option("--cpus", words->cpus, "CPUs of the machine")->type_name("N");
-  command.add_option("--memory", words->memoryMB, "Physical memory in MB")->type_name("MB");
-  command.add_option("--max-vms", words->maxVms, "Virtual machines at most")->type_name("N");
-  command.add_flag("--vm", words->vm, "The machine is itself a virtual one");
-  command.add_option("--cmdline", words->commandLine, "Boot command line")
+void declareBootOptions(CLI::App &command, BootOptions *options) {
+  command.add_option("--cpus", options->cpus, "CPUs of the machine")->type_name("N");
+  command.add_option("--memory", options->memoryMB, "Physical memory in MB")->type_name("MB");
+  command.add_option("--max-vms", options->maxVms, "Virtual machines at most")->type_name("N");
+  command.add_flag("--vm", options->vm, "The machine is a virtual machine");
+  command.add_option("--cmdline", options->commandLine, "Boot command line")
       ->type_name("TEXT")
-      ->each([words](const std::string &) { words->hasCommandLine = true; });
-  command.add_flag("--force", words->force, "Also when the running kernel has groups");
+      ->each([options](const std::string &) { options->hasCommandLine = true; });
+  command.add_flag("--force", options->force, "Even when the running kernel has groups");
 }
 
-void bootKernel(const BootWords &words) {
-  withWords("boot", [&] {
+void bootKernel(const BootOptions &options) {
+  reporting("boot", [&] {
     const Knob::Configuration configuration = Knob::sessionConfiguration();
     if (configuration.kernel != Knob::Configuration::KernelKind::kEmulated) {
       throw Knob::KernelError(Knob::Status::kNotSupported,
                               "the configured kernel is the running system's own");
     }
     Knob::BootFacts facts;
-    facts.cpus = words.cpus;
-    facts.memoryMB = words.memoryMB;
-    facts.maxVms = words.maxVms;
-    if (words.vm) facts.isVm = true;
-    if (words.hasCommandLine) facts.commandLine = words.commandLine;
-    Knob::bootEmulatedKernel(configuration, facts, words.force);
+    facts.cpus = options.cpus;
+    facts.memoryMB = options.memoryMB;
+    facts.maxVms = options.maxVms;
+    if (options.vm) facts.isVm = true;
+    if (options.hasCommandLine) facts.commandLine = options.commandLine;
+    Knob::bootEmulatedKernel(configuration, facts, options.force);
   });
 }
 

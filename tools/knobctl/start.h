@@ -8,8 +8,8 @@
 
 namespace Knobctl {
 
-// What is not given is this machine's own.
-struct BootWords {
+// An absent value is this machine's own.
+struct BootOptions {
   std::optional<uint32_t> cpus, maxVms;
   std::optional<uint64_t> memoryMB;
   bool vm = false;
@@ -18,9 +18,9 @@ struct BootWords {
   bool force = false;
 };
 
-void declareBootWords(CLI::App &command, BootWords *words);
+void declareBootOptions(CLI::App &command, BootOptions *options);
 
 // Throws Failure: busy, when the running kernel has groups and force is not given.
-void bootKernel(const BootWords &words);
+void bootKernel(const BootOptions &options);
 
 }  // namespace Knobctl

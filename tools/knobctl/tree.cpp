@@ -62,7 +62,7 @@ std::string secondsUsed(const std::optional<uint64_t> &microseconds) {
   return std::to_string(tenths / 10) + "." + std::to_string(tenths % 10);
 }
 
-// What of the machine is reserved as "#", and where the maximum stands as "|".
+// The reserved part of the machine as "#", and the maximum as "|".
 std::string bar(int64_t reserved, int64_t max, int64_t machine, Look look) {
   const auto columns = [machine](int64_t amount) {
     if (machine <= 0 || amount <= 0) return int64_t{0};

@@ -16,6 +16,7 @@
 #include "definition_folder.h"
 #include "entry_changes.h"
 #include "files.h"
+#include "folder_check.h"
 #include "installed_mark.h"
 #include "loader/definition_files.h"
 #include "shared/tool.h"
@@ -44,16 +45,15 @@ std::vector<std::string> entryNames(const std::vector<std::string> &paths) {
   return names;
 }
 
-// Checks the copy, since that is what will be installed. The message names the user's file.
-void checkStaged(const StagedFile &staged, const std::string &source) {
-  try {
-    (void)Loader::readFile(staged.path());
-  } catch (const std::exception &error) {
-    const std::string message = error.what();
-    const std::string path = staged.path();
-    if (message.compare(0, path.size(), path) != 0) throw;
-    throw std::runtime_error(source + message.substr(path.size()));
+// The copies are checked, since they are what will be installed.
+std::vector<NewFile> newFiles(const std::vector<std::string> &paths,
+                              const std::vector<std::string> &names,
+                              const std::vector<std::unique_ptr<StagedFile>> &staged) {
+  std::vector<NewFile> files;
+  for (size_t i = 0; i < paths.size(); ++i) {
+    files.push_back({names[i], paths[i], staged[i]->path()});
   }
+  return files;
 }
 
 // A mark that this run sets. Between two steps the file is closed, because a run may mark more
@@ -130,7 +130,7 @@ void warnOfOthers(const DefinitionFolder &folder) {
 
 }  // namespace
 
-void installFiles(const std::vector<std::string> &paths) {
+void installFiles(const std::vector<std::string> &paths, Errors errors) {
   const std::vector<std::string> names = entryNames(paths);
   const SignalGuard signals;
   const DefinitionFolder folder(DefinitionFolder::IfMissing::kCreate, signals);
@@ -139,14 +139,19 @@ void installFiles(const std::vector<std::string> &paths) {
   for (const std::string &path : paths) {
     signals.check();
     staged.push_back(std::make_unique<StagedFile>(folder, path));
-    checkStaged(*staged.back(), path);
-    staged.back()->finish();
+  }
+  FolderCheck check(newFiles(paths, names, staged));
+  check.run(errors);
+  for (const auto &file : staged) {
+    signals.check();
+    file->finish();
   }
   signals.check();
   EntryChanges changes(folder, names);
   for (size_t i = 0; i < staged.size(); ++i) changes.replace(names[i], *staged[i]);
   changes.keep();
   warnOfOthers(folder);
+  check.reportLoadedPools();
 }
 
 void markFiles(const std::vector<std::string> &paths) {

@@ -5,14 +5,17 @@
 #include <string>
 #include <vector>
 
+#include "folder_check.h"
+
 namespace Install {
 
 // Each throws a std::exception whose what() is a message for users and names the file. Everything
 // that was done is undone then; what cannot be undone is reported on standard error. SIGINT,
 // SIGTERM and SIGHUP are held back meanwhile, and take effect between two files.
 
-// Copies each file into the definition folder under its own name, after the loader has accepted it.
-void installFiles(const std::vector<std::string> &paths);
+// Copies each file into the definition folder under its own name, after the check of poolctl-plan.
+// Errors that it finds are refused or, like its warnings, only reported.
+void installFiles(const std::vector<std::string> &paths, Errors errors);
 
 // Marks each file where it is, after the loader has accepted it.
 void markFiles(const std::vector<std::string> &paths);

@@ -15,6 +15,7 @@ namespace {
 struct Options {
   bool mark = false;
   bool remove = false;
+  bool force = false;
   std::vector<std::string> operands;
 };
 
@@ -24,7 +25,8 @@ Tools::ExitStatus act(const Options &options) {
   } else if (options.remove) {
     Install::removeFiles(options.operands);
   } else {
-    Install::installFiles(options.operands);
+    Install::installFiles(options.operands,
+                          options.force ? Install::Errors::kReport : Install::Errors::kRefuse);
   }
   return Tools::kExitSuccess;
 }
@@ -33,8 +35,12 @@ void declareOptions(CLI::App &app, Tools::Action *action) {
   const auto options = std::make_shared<Options>();
   CLI::Option *const mark = app.add_flag(
       "--mark", options->mark, "Mark the files as installed where they are; copy nothing");
-  app.add_flag("--remove", options->remove, "Remove the installed files of these names")
-      ->excludes(mark);
+  CLI::Option *const remove =
+      app.add_flag("--remove", options->remove, "Remove the installed files of these names")
+          ->excludes(mark);
+  app.add_flag("--force", options->force, "Install files with errors all the same")
+      ->excludes(mark)
+      ->excludes(remove);
   app.add_option("FILE", options->operands, "Definition files; with --remove, names in /etc/rp.d")
       ->required();
   app.footer(

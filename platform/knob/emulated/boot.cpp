@@ -81,7 +81,7 @@ void rebootState(const std::string &path, const BootRecord &record, bool force) 
   writeBootRecord(path, record);
 }
 
-// Ids that nobody can hold: those of the state that is lost are unknown, but they did not come
+// Ids that no process knows: those of the lost state are unknown, but they did not come
 // faster than a thousand in a second.
 void skipLostIds(Database &database) {
   Statement statement(database, "UPDATE sqlite_sequence SET seq = ? WHERE name = 'groups'");

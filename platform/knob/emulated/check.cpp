@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// Every group is read once, the reservations are summed up anew from the leaves, and what differs
-// from what is kept is a finding.
+// Reads every group once, sums the reservations up from the leaves, and reports each stored sum
+// that differs.
 #include "knob/emulated/check.h"
 
 #include <algorithm>
@@ -32,7 +32,7 @@ class Checker {
       : database_(database), store_(database), statePath_(std::move(statePath)), repair_(repair) {}
 
   std::vector<Finding> run() {
-    // In a file that is broken itself, nothing that follows means anything.
+    // In a damaged file the other checks mean nothing.
     if (!checkFile()) return std::move(findings_);
     readGroups();
     order(kHostId, "");
@@ -47,9 +47,9 @@ class Checker {
     Statement statement(database_, "PRAGMA quick_check(1)");
     Query query(statement);
     if (!query.step()) return true;
-    const std::string answer = query.text(0);
-    if (answer == "ok") return true;
-    findings_.push_back({statePath_, "the state is damaged: " + answer, false});
+    const std::string result = query.text(0);
+    if (result == "ok") return true;
+    findings_.push_back({statePath_, "the state is damaged: " + result, false});
     return false;
   }
 
@@ -123,7 +123,7 @@ class Checker {
     for (const Member &member : store_.allMembers()) {
       const auto group = groups_.find(member.group);
       const bool known = group != groups_.end() && !group->second.path.empty();
-      // The dead are cleaned away with the next write, and are no fault.
+      // A dead process is not a fault: the next write removes it.
       if (known) continue;
       if (repair_) store_.removeMember(member.pid);
       report(statePath_, "process " + std::to_string(member.pid) + " is in no group that exists");

@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // The rows of the emulated kernel's state: one function for each question and each change, inside a
-// transaction of the caller's. No rule of the kernel stands here.
+// transaction of the caller. The rules of the kernel are elsewhere.
 #pragma once
 
 #include <optional>

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// Everything about the state that is a matter of files: places, rights, locks and settings of
-// SQLite.
+// The state as a file: its place, rights, locks and settings of SQLite.
 #include "knob/emulated/state_file.h"
 
 #include <fcntl.h>
@@ -13,6 +12,8 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "common/build_database.h"
+#include "common/lock_holder.h"
 #include "knob/emulated/schema.h"
 #include "knob/kernel.h"
 
@@ -22,9 +23,16 @@ namespace {
 using Platform::Database;
 using Platform::SqliteError;
 
-// How long a call waits for another process. Operations last microseconds; only a process that
-// was stopped in the middle of one lets others wait.
-constexpr int kBusyMs = 20000;
+// How long a call waits for another process. Operations last microseconds; only a process that was
+// stopped within one keeps the others waiting.
+constexpr int kBusySeconds = 20;
+constexpr int kBusyMs = kBusySeconds * 1000;
+
+std::string busyText(const std::string &path) {
+  // In WAL mode the locks are on the shared memory.
+  return path + ": locked by " + Platform::lockHolderText({path + "-shm", path}) +
+         " for more than " + std::to_string(kBusySeconds) + " seconds";
+}
 
 [[noreturn]] void notUsable(const std::string &path, const std::string &reason) {
   throw KernelError(Status::kKernelNotUsable, path + ": " + reason);
@@ -34,17 +42,17 @@ constexpr int kBusyMs = 20000;
   notUsable(path, std::string("cannot ") + tried + ": " + std::strerror(error));
 }
 
-// Makes the folder when it is missing. Nobody but its owner may change what is in it.
+// Makes the folder when it is missing. Only its owner may have rights to change what is in it.
 void requireOwnFolder(const std::string &folder, mode_t mode) {
   if (::mkdir(folder.c_str(), mode) != 0 && errno != EEXIST) {
     systemFailure(folder, "make the folder", errno);
   }
   struct stat status {};
   if (::lstat(folder.c_str(), &status) != 0) systemFailure(folder, "look at the folder", errno);
-  if (!S_ISDIR(status.st_mode)) notUsable(folder, "is no folder");
+  if (!S_ISDIR(status.st_mode)) notUsable(folder, "is not a folder");
   if (status.st_uid != ::geteuid()) notUsable(folder, "belongs to another user");
   if ((status.st_mode & 0777 & ~mode) != 0) {
-    notUsable(folder, "is open to other users: remove it, or take their rights away");
+    notUsable(folder, "other users have rights on it: remove it, or take their rights away");
   }
 }
 
@@ -63,16 +71,10 @@ void removeIfThere(const std::string &path) {
   if (::unlink(path.c_str()) != 0 && errno != ENOENT) systemFailure(path, "remove", errno);
 }
 
-void removeStateFiles(const std::string &path) {
-  removeIfThere(path + "-wal");
-  removeIfThere(path + "-shm");
-  removeIfThere(path);
-}
-
 void requireVersion(Database &database, const std::string &path) {
   Platform::Statement statement(database, "SELECT version FROM kernel");
   Platform::Query query(statement);
-  if (!query.step()) notUsable(path, "is damaged: it does not say which kernel it is of");
+  if (!query.step()) notUsable(path, "is damaged: it has no version");
   const int64_t version = query.integer(0);
   if (version != kStateVersion) {
     notUsable(path, "is a state of version " + std::to_string(version) + ", this library has " +
@@ -110,7 +112,7 @@ bool stateExists(const std::string &path) {
     if (errno == ENOENT) return false;
     systemFailure(path, "look at the state", errno);
   }
-  if (!S_ISREG(status.st_mode)) notUsable(path, "is no regular file");
+  if (!S_ISREG(status.st_mode)) notUsable(path, "is not a regular file");
   return status.st_size > 0;
 }
 
@@ -127,20 +129,23 @@ BootLock::BootLock(const std::string &statePath) {
 void buildState(const BootLock & /*held*/, const std::string &path,
                 const std::function<void(Database &)> &fill) {
   const std::string beside = path + ".boot";
-  removeStateFiles(beside);  // of a boot that was killed
-  {
-    Database database(beside, Database::Mode::kCreate, kBusyMs);
-    database.execute("PRAGMA synchronous = OFF");
+  Platform::buildDatabase(beside, [&](Database &database) {
+    database.execute("PRAGMA synchronous = OFF");  // the finished file is flushed once
     database.execute(kStatePragmas);
     database.execute("BEGIN");
     database.execute(kStateTables);
     fill(database);
     database.execute("COMMIT");
+  });
+  try {
+    // The log of an earlier state would be taken for part of the new one.
+    removeIfThere(path + "-wal");
+    removeIfThere(path + "-shm");
+    if (::rename(beside.c_str(), path.c_str()) != 0) systemFailure(path, "put the state", errno);
+  } catch (...) {
+    Platform::removeDatabase(beside);
+    throw;
   }
-  // Left over from a state that is gone, they would be taken for parts of the new one.
-  removeIfThere(path + "-wal");
-  removeIfThere(path + "-shm");
-  if (::rename(beside.c_str(), path.c_str()) != 0) systemFailure(path, "put the state", errno);
 }
 
 Database openState(const std::string &path) {
@@ -152,7 +157,8 @@ Database openState(const std::string &path) {
     requireVersion(database, path);
     return database;
   } catch (const SqliteError &error) {
-    if (error.code == SQLITE_ERROR) notUsable(path, "is no state of a kernel");
+    if (error.code == SQLITE_ERROR) notUsable(path, "is not a state of a kernel");
+    if (error.code == SQLITE_BUSY) throw KernelError(Status::kKernelNotUsable, busyText(path));
     notUsable(path, std::string("cannot use the state: ") + error.what());
   }
 }
@@ -164,6 +170,8 @@ void throwStateError(const std::string &path, const SqliteError &error) {
     case SQLITE_NOTADB:
     case SQLITE_CANTOPEN:
       throw KernelError(Status::kKernelNotUsable, text);
+    case SQLITE_BUSY:
+      throw KernelError(Status::kFailure, busyText(path));
     case SQLITE_READONLY:
     case SQLITE_PERM:
       throw KernelError(Status::kPermissionDenied, text);

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The file that holds the emulated kernel's state: where it is, and how it comes to be.
+// The file that holds the emulated kernel's state: where it is, and how it is made.
 #pragma once
 
 #include <functional>
@@ -20,12 +20,12 @@ std::string defaultStatePath();
 // KernelError (kernel not usable) for a default folder that is not safe to use.
 std::string emulatedStatePath(const Configuration &configuration);
 
-// Whether there is something to open: a regular file that is not empty. Throws KernelError (kernel
-// not usable) for what can be no state.
+// Whether there is a state to open: a regular file that is not empty. Throws KernelError (kernel
+// not usable) for what cannot be a state.
 bool stateExists(const std::string &path);
 
-// Keeps other processes from booting a kernel in the same folder. It is given back when its holder
-// ends, however that happens.
+// Keeps other processes from booting a kernel in the same folder. The system releases it when the
+// process ends in any way.
 class BootLock {
  public:
   explicit BootLock(const std::string &statePath);
@@ -34,8 +34,9 @@ class BootLock {
   Platform::UniqueFd folder_;
 };
 
-// Makes a state beside its place, fills it, and moves it there whole, so that nobody ever sees half
-// a state. Under the lock.
+// Makes and fills a state beside its place, and moves it there when it is whole: no process sees a
+// part of a state, and a failure leaves no file behind. Under the lock. Throws SqliteError and
+// KernelError.
 void buildState(const BootLock &lock, const std::string &path,
                 const std::function<void(Platform::Database &)> &fill);
 

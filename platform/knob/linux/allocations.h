@@ -32,7 +32,9 @@ class AllocationManager {
       : tree_(tree),
         facts_(facts),
         capacity_(tree.hierarchy(), facts, reserve),
-        cpu_(tree, facts) {}
+        cpu_(tree, facts, [this](Group &group) { return read(group); }) {}
+  AllocationManager(const AllocationManager &) = delete;
+  AllocationManager &operator=(const AllocationManager &) = delete;
 
   // The record of a group. A directory that belongs to another user is delegated, and its owner can
   // write the record: then no more is reserved than the group above counts for it. Throws

@@ -82,7 +82,7 @@ class Update {
 
   // A group without a record belongs to another program and keeps its weight.
   void give(Group &child, const CpuDivision &division, size_t next) {
-    const StoredRecord stored = readRecord(child.fd());
+    const StoredRecord stored = distribution_.readCounted(child);
     const CpuChild own = distribution_.childOf(stored.record);
     if (stored.isStored) write(child, cpuWeightOf(division, own));
     const bool isDivided =
@@ -166,12 +166,13 @@ HostCpu CpuDistribution::hostCpuBesideOthers(const Record &host) const {
 }
 
 std::string CpuDistribution::tooHeavyText() const {
-  std::string text = "the groups beside host weigh too much for it:";
+  std::string others;
   for (const Child &other : tree_.besideHost()) {
-    text += (text.back() == ':' ? " " : ", ") + other.name + " " +
-            std::to_string(weightBeside(tree_, other));
+    others += (others.empty() ? "" : ", ") + other.name + " (" +
+              std::to_string(weightBeside(tree_, other)) + ")";
   }
-  return text;
+  return "no cpu.weight of host keeps its CPU reservation beside " + others +
+         "; lower their weights or reserve less";
 }
 
 }  // namespace Knob::Linux

@@ -6,7 +6,9 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <string>
+#include <utility>
 
 #include "knob/kernel.h"
 #include "knob/linux/cgroup_tree.h"
@@ -25,7 +27,10 @@ struct CpuChildChange {
 
 class CpuDistribution {
  public:
-  CpuDistribution(CgroupTree &tree, const HostFacts &facts) : tree_(tree), facts_(facts) {}
+  // read: the record of a group, with no larger reservation than the groups above count.
+  using Reader = std::function<StoredRecord(Group &)>;
+  CpuDistribution(CgroupTree &tree, const HostFacts &facts, Reader read)
+      : tree_(tree), facts_(facts), read_(std::move(read)) {}
 
   // Throws KernelError, reservation refused, where host cannot keep this reservation beside the
   // groups of other programs, whatever its weight. The message names them.
@@ -40,16 +45,18 @@ class CpuDistribution {
   // The weight that the records ask for, as far as they are up to date.
   int64_t recordedWeight(Group &group, const Record &record) const;
 
+  StoredRecord readCounted(Group &group) const { return read_(group); }
   CpuChild childOf(const Record &record) const;
   HostCpu hostCpuBesideOthers(const Record &host) const;
   MachinePart partOf(int64_t percent) const { return machinePart(percent, facts_.cpus); }
 
-  // "the groups beside host weigh too much for it: system.slice 10000, user.slice 100".
+  // Why host cannot keep its reservation, with the names and weights of the groups beside it.
   std::string tooHeavyText() const;
 
  private:
   CgroupTree &tree_;
   const HostFacts &facts_;
+  Reader read_;
 };
 
 // The division and the sums of a group whose children, as counted, reserve this part in all.

@@ -56,6 +56,11 @@ bool isSound(const ResourceState &state) {
   }
 }
 
+bool isSound(const CpuChildren &children) {
+  constexpr uint64_t kMaxCount = uint64_t{1} << 32;
+  return children.count <= kMaxCount && children.shareWeight <= children.count * kMaxCpuWeight;
+}
+
 uint64_t limitIn(int directory, Control control) {
   const uint64_t initial = parseLimit(infoOf(control).initialText).value_or(0);
   const auto text = readControlIfAny(directory, infoOf(control).name);
@@ -113,7 +118,9 @@ std::optional<Record> decode(std::string_view bytes) {
                 {from.ownPeakKB, from.childrenPeakKB},
                 std::nullopt};
   if ((from.flags & kHasSavedHigh) != 0) record.savedHigh = from.savedHigh;
-  if (!isSound(record.memory) || !isSound(record.cpu)) return std::nullopt;
+  if (!isSound(record.memory) || !isSound(record.cpu) || !isSound(record.cpuChildren)) {
+    return std::nullopt;
+  }
   return record;
 }
 

@@ -80,10 +80,15 @@ TEST_F(Install, RefusalLeavesNoNewFolder) {
   EXPECT_FALSE(fs::exists(world.etc() / "rp.d"));
 }
 
-TEST_F(Install, BadDefinitionIsRefusedWithTheLoadersMessage) {
+TEST_F(Install, BadDefinitionIsRefusedWithItsPlaceAndCause) {
   world.rpD();
   const std::string path = source("a.yaml", kBad);
-  expectRefusal(install({path}), path + ": line 2 column 3: invalid rp field");
+  const ProcessResult result = install({path});
+  EXPECT_EQ(result.status, 1);
+  EXPECT_THAT(result.err,
+              StartsWith(path + ":2:3: error: unknown key \"memMinimum\" [unknown-key]\n"));
+  EXPECT_THAT(result.err, HasSubstr("\npoolctl-install: 1 error; nothing is installed "
+                                    "(--force installs all the same)\n"));
   EXPECT_THAT(entriesOf(world.rpD()), IsEmpty());
 }
 
@@ -91,7 +96,69 @@ TEST_F(Install, BrokenYamlIsRefused) {
   const std::string path = source("a.yaml", "- [\n");
   const ProcessResult result = install({path});
   EXPECT_EQ(result.status, 1);
-  EXPECT_THAT(result.err, StartsWith("poolctl-install: " + path + ": line "));
+  EXPECT_THAT(result.err, StartsWith(path + ":1:3: error: a bracket is not closed"));
+}
+
+TEST_F(Install, WhatLoadWouldRefuseIsRefused) {
+  const ProcessResult result =
+      install({source("a.yaml", "- name: a\n  memMin: 300\n  memMax: 200\n")});
+  EXPECT_EQ(result.status, 1);
+  EXPECT_THAT(result.err, HasSubstr("error: memMin 300 is above memMax 200 [min-above-max]"));
+}
+
+TEST_F(Install, ErrorsAreInstalledWithForce) {
+  const ProcessResult result = install({"--force", source("a.yaml", kBad)});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_THAT(result.err, HasSubstr("error: unknown key"));
+  EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("a.yaml"));
+}
+
+TEST_F(Install, WarningsArePrintedAndTheFileIsInstalled) {
+  const ProcessResult result = install({source("a.yaml", "- name: a\n  memMax: 2\n")});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_THAT(result.err, HasSubstr("a.yaml:2:3: warning: the maximum is 2 MB"));
+  EXPECT_THAT(entriesOf(world.rpD()), ElementsAre("a.yaml"));
+}
+
+TEST_F(Install, ErrorsOfOtherInstalledFilesDoNotCount) {
+  world.definition("z.yaml", kBad);
+  const ProcessResult result = install({source("a.yaml", kOther)});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_EQ(result.err, "");
+}
+
+TEST_F(Install, ErrorsThatTheNewFileCausesElsewhereCount) {
+  ASSERT_EQ(world.run("knobctl", {"boot", "--cpus", "4", "--memory", "1024"}).status, 0);
+  world.definition("z.yaml", "- name: z\n  memMin: 600\n");
+  const ProcessResult result = install({source("a.yaml", "- name: a\n  memMin: 600\n")});
+  EXPECT_EQ(result.status, 1);
+  EXPECT_THAT(result.err, HasSubstr("/etc/rp.d/z.yaml:2:3: error: the memory does not fit"));
+}
+
+TEST_F(Install, ParentsMayBeInstalledAlready) {
+  world.definition("web.yaml", "- name: web\n  memMax: 512\n");
+  const std::string child = source("cache.yaml", "- name: web/cache\n  memMax: 64\n");
+  EXPECT_EQ(install({child}).err, "");
+}
+
+TEST_F(Install, LoadedPoolsThatKeepTheirValuesAreNamed) {
+  ASSERT_EQ(install({source("a.yaml", "- name: a\n  memMax: 128\n")}).status, 0);
+  ASSERT_EQ(world.poolctl({"load"}).status, 0);
+  const ProcessResult result = install({source("a.yaml", "- name: a\n  memMax: 160\n")});
+  EXPECT_EQ(result.status, 0);
+  EXPECT_EQ(result.err,
+            "poolctl-install: note: host/opt/a is loaded with other values and keeps them; "
+            "poolctl-plan diff shows them, and poolctl-plan apply changes them\n");
+}
+
+TEST_F(Install, WithoutAKernelOnlyWhatNeedsOneIsLeftUnchecked) {
+  writeFile(world.folder() / "knob.conf", "kernel = none\n");
+  const ProcessResult good =
+      install({source("a.yaml", "- name: a\n  memMax: !calc physKB / 4096\n")});
+  EXPECT_EQ(good.status, 0);
+  EXPECT_THAT(good.err, StartsWith("poolctl-install: note: no usable kernel: "));
+  EXPECT_THAT(good.err, HasSubstr("`knobctl status`"));
+  EXPECT_EQ(install({source("b.yaml", kBad)}).status, 1);
 }
 
 TEST_F(Install, EmptyFileDeclaresNoPools) {

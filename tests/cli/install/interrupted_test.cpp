@@ -133,17 +133,18 @@ TEST_F(InterruptedInstall, UndoThatIsKilledIsCompletedByTheNextRun) {
   }
 }
 
-TEST_F(InterruptedInstall, CopyIsPrivateUntilItHasBeenChecked) {
+TEST_F(InterruptedInstall, CopiesArePrivateUntilTheyHaveBeenChecked) {
   reset();
   for (int step = 1; hidden().empty(); ++step) {
     ASSERT_LT(step, kMaxSteps);
     installUntil(step, SIGKILL, change);
     fs::remove(world.rpD() / ".install.lock");
   }
-  ASSERT_EQ(hidden().size(), 1U);
-  const fs::path copy = world.rpD() / hidden().front();
-  EXPECT_EQ(readFile(copy), kOther);
-  EXPECT_EQ(fs::status(copy).permissions(), fs::perms::owner_read | fs::perms::owner_write);
+  for (const std::string &name : hidden()) {
+    const fs::path copy = world.rpD() / name;
+    EXPECT_NE(readFile(copy), "");
+    EXPECT_EQ(fs::status(copy).permissions(), fs::perms::owner_read | fs::perms::owner_write);
+  }
 }
 
 TEST_F(InterruptedInstall, ForeignHiddenFilesStay) {

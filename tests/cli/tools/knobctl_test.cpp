@@ -174,6 +174,54 @@ TEST_F(Knobctl, StatsPrintsAllThatIsKnownOfAGroup) {
   EXPECT_THAT(out({"stats", "host"}), HasSubstr("memory children peak KB   524288\n"));
 }
 
+TEST_F(Knobctl, SetChangesWhatIsGivenAndNothingElse) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-min", "512", "--mem-max", "1024", "--mem-min-limit",
+                 "600", "--mem-shares", "high", "--cpu-min", "50", "--cpu-max", "150",
+                 "--cpu-min-limit", "60", "--cpu-shares", "77"}),
+            "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-max", "none", "--cpu-min", "0"}), "");
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             512\n"
+                                                      "memory max MB             none\n"
+                                                      "memory minLimit MB        600\n"
+                                                      "memory shares             high\n"));
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("CPU min %                 0\n"
+                                                      "CPU max %                 150\n"
+                                                      "CPU minLimit %            60\n"
+                                                      "CPU shares                77\n"));
+}
+
+TEST_F(Knobctl, SetReportsWhyItIsRefusedAndChangesNothing) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(err(1, {"set", "host/opt/a", "--mem-min", "300", "--mem-max", "200"}),
+            "knobctl: set host/opt/a: memory: bad parameter: min 300 is above max 200\n");
+  EXPECT_THAT(err(1, {"set", "host/opt/a", "--mem-min", "8193"}),
+              StartsWith("knobctl: set host/opt/a: memory: reservation refused"));
+  EXPECT_EQ(err(3, {"set", "host/opt/b", "--mem-min", "1"}),
+            "knobctl: set host/opt/b: not found\n");
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             0\n"));
+}
+
+TEST_F(Knobctl, SetPutsTheMemoryBackWhenTheCpuIsRefused) {
+  EXPECT_EQ(out({"create", "host/opt/a"}), "");
+  EXPECT_EQ(out({"set", "host/opt/a", "--mem-min", "5", "--mem-max", "64"}), "");
+  EXPECT_THAT(err(1, {"set", "host/opt/a", "--mem-min", "7", "--cpu-min", "401"}),
+              StartsWith("knobctl: set host/opt/a: CPU: reservation refused"));
+  EXPECT_THAT(out({"stats", "host/opt/a"}), HasSubstr("memory min MB             5\n"
+                                                      "memory max MB             64\n"));
+}
+
+TEST_F(Knobctl, SetRefusesValuesThatAreNotAmounts) {
+  EXPECT_THAT(err(2, {"set", "host/opt"}), HasSubstr("no setting is given"));
+  for (const char *value : {"-1", "x", "", "1.5", "none", "9223372036854775808"}) {
+    EXPECT_THAT(err(2, {"set", "host/opt", "--mem-min", value}),
+                HasSubstr("is not a number from 0 up"))
+        << value;
+  }
+  EXPECT_THAT(err(2, {"set", "host/opt", "--cpu-shares", "huge"}),
+              HasSubstr("\"huge\" is not low, normal, high or a number from 0 up"));
+}
+
 TEST_F(Knobctl, TreeAlignsGroupsAndDrawsThemAgainstTheMachine) {
   EXPECT_EQ(out({"create", "host/opt/z"}), "");
   EXPECT_EQ(out({"create", "host/opt/backup"}), "");
@@ -350,7 +398,7 @@ TEST_F(Knobctl, AWrongLineIsAUsageError) {
 
 TEST_F(Knobctl, EveryCommandHasHelpOnStandardOutput) {
   for (const char *command :
-       {"boot", "status", "tree", "stats", "facts", "check", "create", "delete", "join"}) {
+       {"boot", "status", "tree", "stats", "facts", "check", "create", "set", "delete", "join"}) {
     EXPECT_THAT(out({"--help"}), HasSubstr(command));
     EXPECT_THAT(out({command, "--help"}), HasSubstr(std::string("knobctl ") + command));
   }

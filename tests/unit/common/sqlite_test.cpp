@@ -5,14 +5,14 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <optional>
 #include <thread>
 
+#include "sqlite_memory_limit.h"
 #include "temp_folder.h"
 
 namespace Platform {
 namespace {
-
-using Query = Query;  // testing::Test has a Query of its own
 
 class Sqlite : public testing::Test {
  protected:
@@ -109,6 +109,19 @@ TEST_F(Sqlite, ATransactionThatSqliteEndedItselfIsLeftAlone) {
     database_.execute("ROLLBACK");
   }
   EXPECT_EQ(rows(), 0);
+}
+
+TEST_F(Sqlite, ATransactionEndsWithoutAnyMemory) {
+  TransactionStatements statements(database_);
+  std::optional<Transaction> transaction;
+  transaction.emplace(statements, Transaction::Kind::kWrite);
+  database_.execute("INSERT INTO t VALUES (1, 0.5, 'x')");
+  {
+    const ::Test::SqliteMemoryLimit none(0);
+    transaction.reset();
+  }
+  EXPECT_EQ(rows(), 0);
+  Transaction(statements, Transaction::Kind::kWrite).commit();
 }
 
 TEST_F(Sqlite, AReaderOfAMissingFileFailsAndMakesNone) {

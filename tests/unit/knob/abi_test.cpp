@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// The C functions: null and small buffers, one wrapper for what is thrown, and what they answer
-// when memory ends. Built with the library's own objects, so that allocations can be made to fail.
+// The C functions: null and small buffers, one wrapper for what is thrown, and what they return
+// without memory. Built with the library's own objects, so that allocations can be made to fail.
 #include <gtest/gtest.h>
 
 #include <cstdlib>
@@ -15,6 +15,7 @@
 #include "knob/status.h"
 #include "platform/knob.h"
 #include "platform/knob_status.h"
+#include "sqlite_memory_limit.h"
 #include "temp_folder.h"
 
 namespace {
@@ -417,6 +418,28 @@ TEST_F(OutOfMemory, NoGroupIsMade) {
         return KNOB_Set(KNOB_NODE_sched_groups_groupCreate, instance_, name, &id, sizeof(id));
       },
       [&] { EXPECT_EQ(childrenOfOpt(), 0); });
+  EXPECT_EQ(childrenOfOpt(), 1);
+  KNOB_ParamListDestroy(name);
+}
+
+TEST_F(OutOfMemory, NoGroupIsMadeWhenSqliteHasNoMemory) {
+  KNOB_ParamList *name = textList("pool");
+  int64_t id = -1;
+  int failures = 0;
+  for (int moreBytes = 0;; moreBytes += 1000) {
+    ASSERT_LT(moreBytes, 1000000) << "never succeeded";
+    ASSERT_EQ(childrenOfOpt(), 0);  // opens the state, and works after every failure
+    KNOB_ReturnStatus status = 0;
+    {
+      const ::Test::SqliteMemoryLimit limit(moreBytes);
+      status = KNOB_Set(KNOB_NODE_sched_groups_groupCreate, instance_, name, &id, sizeof(id));
+    }
+    if (status == 0) break;
+    ASSERT_EQ(status, number(Status::kOutOfMemory)) << moreBytes;
+    LiveKernel::instance().close();
+    ++failures;
+  }
+  EXPECT_GT(failures, 0);
   EXPECT_EQ(childrenOfOpt(), 1);
   KNOB_ParamListDestroy(name);
 }

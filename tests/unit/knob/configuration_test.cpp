@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <cstdlib>
 
@@ -87,9 +88,14 @@ TEST_F(KnobConf, AFileThatIsNamedMustExist) {
   EXPECT_THAT(refusal(), HasSubstr("no such file (named by KNOB_CONF)"));
 }
 
-TEST_F(KnobConf, AFolderIsNoFile) {
+TEST_F(KnobConf, AFolderIsRefused) {
   ::setenv("KNOB_CONF", folder_.path().c_str(), 1);
-  EXPECT_THAT(refusal(), HasSubstr("Is a directory"));
+  EXPECT_THAT(refusal(), HasSubstr(": not a regular file"));
+}
+
+TEST_F(KnobConf, AFifoIsRefusedAndNotWaitedFor) {
+  ASSERT_EQ(::mkfifo(file_.c_str(), 0600), 0);
+  EXPECT_EQ(refusal(), file_ + ": not a regular file");
 }
 
 TEST_F(KnobConf, AnEmptyNameIsNoName) {

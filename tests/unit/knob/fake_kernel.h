@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// A kernel that remembers what it was asked and answers what the test wants.
+// A kernel that records its calls and returns what the test wants.
 #pragma once
 
 #include <string>

@@ -2,12 +2,18 @@
 // The emulated kernel's state: how it comes to be, what may be wrong with it, and what a boot does.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sched.h>
+#include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <array>
+#include <csignal>
 #include <cstdlib>
+#include <filesystem>
 #include <functional>
+#include <iostream>
 
 #include "common/sqlite.h"
 #include "knob/emulated/boot.h"
@@ -92,6 +98,73 @@ TEST_F(State, TheFirstUseBootsWithThisMachinesFacts) {
   EXPECT_GT(facts.memoryKB, 1024U);
 }
 
+// Uses a kernel for the first time on a disk of that size, in a process of its own. Returns what is
+// wrong: empty when the use succeeded, or failed and left nothing behind.
+std::string firstUseOnDisk(const std::string &folder, size_t bytes, bool *succeeded) {
+  if (::unshare(CLONE_NEWNS) != 0) return "unshare";
+  if (::mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0) return "private";
+  const std::string size = "size=" + std::to_string(bytes);
+  if (::mount("tmpfs", folder.c_str(), "tmpfs", 0, size.c_str()) != 0) return "mount";
+  Configuration configuration;
+  configuration.statePath = folder + "/kernel.db";
+  try {
+    (void)openEmulatedKernel(configuration);
+    *succeeded = true;
+  } catch (const KernelError &error) {
+    if (error.status != Status::kKernelNotUsable) return "status: " + std::string(error.what());
+    const std::filesystem::directory_iterator files(folder);
+    return files == end(files) ? "" : "left " + files->path().string();
+  }
+  const auto findings = openEmulatedKernel(configuration)->check(false);
+  return findings.empty() ? "" : findings.front().text;
+}
+
+TEST_F(State, AFirstUseOnAFullDiskLeavesNothingBehind) {
+  if (::geteuid() != 0) GTEST_SKIP() << "not root";
+  constexpr int kSuccess = 0, kFailure = 1, kWrong = 2;
+  constexpr size_t kPage = 4096;
+  int failures = 0, successes = 0;
+  for (size_t pages = 1; successes < 10; ++pages) {
+    ASSERT_LT(pages, 200U);
+    const pid_t child = ::fork();
+    if (child == 0) {
+      bool succeeded = false;
+      const std::string wrong = firstUseOnDisk(folder_.path(), pages * kPage, &succeeded);
+      if (!wrong.empty()) std::cerr << pages << " pages: " << wrong << '\n';
+      ::_exit(!wrong.empty() ? kWrong : succeeded ? kSuccess : kFailure);
+    }
+    int status = 0;
+    ASSERT_EQ(::waitpid(child, &status, 0), child);
+    ASSERT_TRUE(WIFEXITED(status));
+    ASSERT_NE(WEXITSTATUS(status), kWrong);
+    ++(WEXITSTATUS(status) == kSuccess ? successes : failures);
+  }
+  EXPECT_GT(failures, 5);
+}
+
+TEST_F(State, AStateThatAnotherProcessHoldsNamesIt) {
+  (void)open();
+  std::array<int, 2> ready{};
+  ASSERT_EQ(::pipe(ready.data()), 0);
+  const pid_t holder = ::fork();
+  if (holder == 0) {
+    Platform::Database database(path_, Platform::Database::Mode::kReadWrite, 0);
+    database.execute("BEGIN IMMEDIATE");
+    (void)!::write(ready[1], "x", 1);
+    for (;;) ::pause();
+  }
+  char byte = 0;
+  EXPECT_EQ(::read(ready[0], &byte, 1), 1);
+  const Refusal refusal =
+      refusalOf([&] { throwStateError(path_, Platform::SqliteError(SQLITE_BUSY, "busy")); });
+  EXPECT_EQ(refusal.status, Status::kFailure);
+  EXPECT_EQ(refusal.reason, path_ + ": locked by process " + std::to_string(holder) +
+                                " (knob_test) for more than 20 seconds");
+  (void)::kill(holder, SIGKILL);
+  (void)::waitpid(holder, nullptr, 0);
+  for (const int end : ready) (void)::close(end);
+}
+
 TEST_F(State, MaxVmsIsTheConfigurationsUnlessTheBootHadOneOfItsOwn) {
   configuration_.maxVms = 5;
   EXPECT_EQ(open()->facts().maxVms, 5U);
@@ -161,7 +234,7 @@ TEST_F(State, AFolderThatDoesNotExistIsAReason) {
 
 TEST_F(State, AFolderInItsPlaceIsAReason) {
   std::filesystem::create_directory(path_);
-  EXPECT_THAT(notUsable(), HasSubstr("is no regular file"));
+  EXPECT_THAT(notUsable(), HasSubstr("is not a regular file"));
 }
 
 TEST_F(State, APathThroughAFileIsAReason) {
@@ -177,7 +250,7 @@ TEST_F(State, AFileThatIsNoDatabaseIsAReason) {
 
 TEST_F(State, ADatabaseOfSomethingElseIsAReason) {
   Platform::Database(path_, Platform::Database::Mode::kCreate, 0).execute("CREATE TABLE t (i)");
-  EXPECT_THAT(notUsable(), HasSubstr("is no state of a kernel"));
+  EXPECT_THAT(notUsable(), HasSubstr("is not a state of a kernel"));
 }
 
 TEST_F(State, AnotherVersionIsAReason) {
@@ -464,12 +537,12 @@ TEST_F(DefaultPlace, AFolderThatIsOpenToOthersIsRefused) {
                 std::filesystem::create_directory(own());
                 ::chmod(own().c_str(), 0770);
               }),
-              HasSubstr(own() + ": is open to other users"));
+              HasSubstr(own() + ": other users have rights on it"));
 }
 
 TEST_F(DefaultPlace, ALinkIsRefused) {
   EXPECT_EQ(placeOfNobody([&] { std::filesystem::create_symlink("/", own()); }),
-            own() + ": is no folder");
+            own() + ": is not a folder");
 }
 
 TEST_F(DefaultPlace, ATempFolderThatCannotBeWrittenIsAReason) {

@@ -118,7 +118,10 @@ TEST(Record, ValuesThatNoOperationWritesAreDamaged) {
   EXPECT_FALSE(decode(withNumber(5, 601))) << "CPU min above max";
   EXPECT_FALSE(decode(withNumber(8, -5))) << "CPU shares";
   EXPECT_FALSE(decode(withNumber(9, -1))) << "CPU sum";
+  EXPECT_FALSE(decode(withNumber(13, -1))) << "number of children";
+  EXPECT_FALSE(decode(withNumber(14, 70001))) << "weight of seven children";
   EXPECT_TRUE(decode(withNumber(4, 0)));
+  EXPECT_TRUE(decode(withNumber(14, 70000)));
 }
 
 }  // namespace
