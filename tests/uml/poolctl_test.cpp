@@ -128,7 +128,7 @@ TEST_F(Poolctl, DisableGivesTheReservationBackAndEnableTakesItAgain) {
 TEST_F(Poolctl, DisableOfAPoolThatIsNotThereSaysSo) {
   const ::Test::ProcessResult result = world.poolctl({"disable", "host/opt/none"});
   EXPECT_EQ(result.status, 0);
-  EXPECT_EQ(result.out, "host/opt/none: KNOB_Set: not found\n");
+  EXPECT_EQ(result.out, "host/opt/none: KNOB_Set: not found: host/opt/none\n");
 }
 
 TEST_F(Poolctl, OptionModeReadsAndSizesAGroup) {

@@ -12,6 +12,7 @@
 
 #include "knob/admission.h"
 #include "knob/allocation.h"
+#include "knob/linux/fixed_groups.h"
 #include "knob/linux/lowering.h"
 #include "knob/linux/oom_score.h"
 #include "knob/names.h"
@@ -77,6 +78,9 @@ void AllocationManager::change(Group &group, Resource resource, const Allocation
   StoredRecord stored = readToChange(group);
   const Allocation current = stored.record.state(resource).allocation;
   const Allocation wanted = changedAllocation(current, change);
+  if (resource == Resource::kMemory && wanted.max == 0 && isFixedGroup(tree_, group)) {
+    throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be disabled");
+  }
   if (stored.record.savedHigh) restoreMemoryHigh(group, stored.record);
   if (areEqual(wanted, current)) return;
   requireNoneReservedBelow(stored.record.state(resource), wanted);

@@ -34,6 +34,10 @@ bool isFixed(const std::vector<std::string_view> &path) {
   return path.size() == 1 || (path.size() == 2 && path[1] == kFixedChildName);
 }
 
+[[noreturn]] void notFound(std::string_view path) {
+  throw KernelError(Status::kNotFound, std::string(path));
+}
+
 GroupUsage usageOf(const Group &group) {
   GroupUsage usage;
   if (const auto bytes = readControlIfAny(group.fd(), kMemoryCurrentFile)) {
@@ -54,13 +58,13 @@ class LinuxKernel final : public Kernel {
 
   GroupId lookUp(std::string_view path) override {
     const auto components = splitPath(path);
-    if (!components || components->front() != kRootName) noSuchGroup();
+    if (!components || components->front() != kRootName) notFound(path);
     GroupPtr group = tree_.lookUp(path);
     if (!group && isFixed(*components)) {
       makeFixedGroups(tree_);
       group = tree_.lookUp(path);
     }
-    if (!group) noSuchGroup();
+    if (!group) notFound(path);
     return group->id;
   }
 
@@ -94,9 +98,6 @@ class LinuxKernel final : public Kernel {
   void setAllocation(GroupId id, Resource resource, const AllocationChange &change) override {
     const TreeLock lock(host()->fd(), TreeLock::Kind::kExclusive);
     const GroupPtr group = find(id);
-    if (resource == Resource::kMemory && change.max == 0 && isFixedGroup(tree_, *group)) {
-      throw KernelError(Status::kPermissionDenied, "host and host/opt cannot be disabled");
-    }
     allocations_.change(*group, resource, change);
   }
 
