@@ -78,7 +78,7 @@ class Storm : public LinuxTest {
 TEST_F(Storm, FiftyKillsLeaveEachProcessOfAPoolWithinItsMinimum) {
   ASSERT_TRUE(silentlyDone(load("- name: kept\n  memMin: 120\n")));
   std::vector<std::unique_ptr<Member>> members;
-  for (const size_t megabytes : {60, 20, 10, 1})
+  for (const size_t megabytes : {60U, 20U, 10U, 1U})
     members.push_back(std::make_unique<Member>(&world, "host/opt/kept", megabytes));
   const auto allAlive = [&] {
     for (const auto &member : members)

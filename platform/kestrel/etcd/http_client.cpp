@@ -172,7 +172,7 @@ bool isUntrusted(CURLcode result, std::string_view text, bool closed) {
 // One request and all that libcurl refers to while it is under way.
 struct HttpClient::Exchange {
   struct HandleDeleter {
-    void operator()(CURL *handle) const { curl_easy_cleanup(handle); }
+    void operator()(CURL *easy) const { curl_easy_cleanup(easy); }
   };
 
   Exchange(CURLM *multiHandle, Id number, HttpRequest what)

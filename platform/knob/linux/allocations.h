@@ -30,7 +30,6 @@ class AllocationManager {
   // The references must outlive this object.
   AllocationManager(CgroupTree &tree, const HostFacts &facts, const Reserve &reserve)
       : tree_(tree),
-        facts_(facts),
         capacity_(tree.hierarchy(), facts, reserve),
         cpu_(tree, facts, [this](Group &group) { return read(group); }) {}
   AllocationManager(const AllocationManager &) = delete;
@@ -94,7 +93,6 @@ class AllocationManager {
   void writeAncestor(UndoableWrites &writes, const Ancestor &ancestor) const;
 
   CgroupTree &tree_;
-  const HostFacts &facts_;
   Capacity capacity_;
   CpuDistribution cpu_;
 };

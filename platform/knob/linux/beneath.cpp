@@ -22,7 +22,7 @@ constexpr int kDirectoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 constexpr int kKernfsHandleType = 0xfe;
 
 struct KernfsHandle {
-  file_handle head;  // ends in a flexible array: the id follows it
+  __extension__ file_handle head;  // ends in a flexible array: the id follows it
   uint64_t id;
 };
 static_assert(sizeof(file_handle) == offsetof(KernfsHandle, id));

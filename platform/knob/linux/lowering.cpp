@@ -100,7 +100,7 @@ void lowerMemoryMax(CgroupTree &tree, Group &group, const StoredRecord &stored,
   writes.write(group, Control::kMemoryMax, before, after);
 }
 
-LiftedMaximum::LiftedMaximum(CgroupTree &tree, GroupPtr group) : tree_(tree) {
+LiftedMaximum::LiftedMaximum(CgroupTree &tree, GroupPtr group) {
   const char *name = infoOf(Control::kMemoryMax).name;
   std::vector<GroupPtr> zero;
   for (; group; group = tree.parentOf(*group)) {

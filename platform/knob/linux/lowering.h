@@ -37,7 +37,6 @@ class LiftedMaximum {
   LiftedMaximum &operator=(const LiftedMaximum &) = delete;
 
  private:
-  CgroupTree &tree_;
   std::vector<GroupPtr> lifted_;
 };
 

@@ -88,7 +88,7 @@ TEST_F(Message, KeepsControlCharactersForScripts) {
 }
 
 TEST_F(Message, IsContinuedAfterAShortWrite) {
-  for (const size_t bytes : {1, 2, 3, 5}) {
+  for (const size_t bytes : {1U, 2U, 3U, 5U}) {
     written.clear();
     mostBytes = bytes;
     Console::printError("ab", "", "cde");
@@ -120,7 +120,7 @@ TEST_F(MessageOnATerminal, HasItsControlCharactersEscaped) {
 }
 
 TEST_F(MessageOnATerminal, MayBeLongerThanTheBuffer) {
-  for (const size_t length : {1024, 4090, 4095, 4096, 4097, 20000}) {
+  for (const size_t length : {1024U, 4090U, 4095U, 4096U, 4097U, 20000U}) {
     written.clear();
     Console::printError(std::string(length, 'x'), "\x1b", "y");
     EXPECT_EQ(std::string(length, 'x') + "\\x1by\n", written) << length;

@@ -40,10 +40,10 @@ std::function<void()> afterPath;
 
 }  // namespace
 
-static ssize_t answer(const std::map<std::string, Answer> &answers, const char *name, void *value,
+static ssize_t answer(const std::map<std::string, Answer> &scripted, const char *name, void *value,
                       size_t size) {
-  const auto found = answers.find(name);
-  const Answer given = found == answers.end() ? Answer{ENOTSUP, ""} : found->second;
+  const auto found = scripted.find(name);
+  const Answer given = found == scripted.end() ? Answer{ENOTSUP, ""} : found->second;
   errno = given.error;
   if (given.error == 0 && size < given.value.size()) errno = ERANGE;
   if (errno != 0) return -1;
