@@ -25,6 +25,7 @@ constexpr const char *kWhere = "etcd";
 // After this time without a response the next member is asked as well.
 constexpr Milliseconds kHedge{200};
 constexpr Milliseconds kPause{20};  // for members to catch up, or to elect a leader
+constexpr Milliseconds kGrace{20};
 
 // Why one member gave no usable response.
 class MemberFailure : public std::runtime_error {
@@ -192,7 +193,9 @@ class Members::Round {
     http.url = member->url + request_.path;
     http.json = request_.json;
     http.token = members_.token_.value_or("");
-    http.connect = http.whole = deadline_.left();
+    // Rounded to milliseconds, libcurl's limit could come before the round's own, and a member that
+    // was only not asked long enough would count as one that failed.
+    http.connect = http.whole = deadline_.left() + kGrace;
     http.maxBytes = request_.maxBytes;
     sent_.emplace_back(members_.http_.start(std::move(http)), member);
   }

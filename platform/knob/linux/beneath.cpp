@@ -8,8 +8,10 @@
 #include <sys/syscall.h>
 #include <unistd.h>
 
+#include <array>
 #include <cerrno>
 #include <climits>
+#include <cstddef>
 #include <cstring>
 
 namespace Knob::Linux {
@@ -21,11 +23,27 @@ constexpr int kDirectoryFlags = O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC;
 // The type of a cgroup's file handle, which consists of its 64-bit id.
 constexpr int kKernfsHandleType = 0xfe;
 
-struct KernfsHandle {
-  __extension__ file_handle head;  // ends in a flexible array: the id follows it
-  uint64_t id;
+// A file handle with room for a 64-bit id. file_handle ends in a flexible array, which no C++ class
+// may contain, so it is a view of the bytes.
+class KernfsHandle {
+ public:
+  explicit KernfsHandle(uint64_t id = 0) {
+    get()->handle_bytes = sizeof id;
+    get()->handle_type = kKernfsHandleType;
+    std::memcpy(bytes_.data() + sizeof(file_handle), &id, sizeof id);
+  }
+
+  file_handle *get() { return reinterpret_cast<file_handle *>(bytes_.data()); }
+
+  uint64_t id() const {
+    uint64_t id = 0;
+    std::memcpy(&id, bytes_.data() + sizeof(file_handle), sizeof id);
+    return id;
+  }
+
+ private:
+  alignas(file_handle) std::array<std::byte, sizeof(file_handle) + sizeof(uint64_t)> bytes_{};
 };
-static_assert(sizeof(file_handle) == offsetof(KernfsHandle, id));
 
 int callOpenat2(int directory, const std::string &path, UniqueFd &opened) {
   open_how how{};
@@ -84,12 +102,11 @@ int openByComponents(int directory, std::string_view path, UniqueFd &opened) {
 }
 
 int identify(int directory, const char *path, Identity &identity) {
-  KernfsHandle handle{};
-  handle.head.handle_bytes = sizeof handle.id;
+  KernfsHandle handle;
   int mount = 0;
-  if (::name_to_handle_at(directory, path, &handle.head, &mount, AT_EMPTY_PATH) == 0) {
-    if (handle.head.handle_type == kKernfsHandleType) {
-      identity = {static_cast<GroupId>(handle.id), static_cast<uint64_t>(mount)};
+  if (::name_to_handle_at(directory, path, handle.get(), &mount, AT_EMPTY_PATH) == 0) {
+    if (handle.get()->handle_type == kKernfsHandleType) {
+      identity = {static_cast<GroupId>(handle.id()), static_cast<uint64_t>(mount)};
       return 0;
     }
     return identifyByInode(directory, path, identity);
@@ -100,11 +117,8 @@ int identify(int directory, const char *path, Identity &identity) {
 }
 
 int openById(int anyDirectory, GroupId id, UniqueFd &opened) {
-  KernfsHandle handle{};
-  handle.head.handle_bytes = sizeof handle.id;
-  handle.head.handle_type = kKernfsHandleType;
-  handle.id = static_cast<uint64_t>(id);
-  opened = UniqueFd(::open_by_handle_at(anyDirectory, &handle.head, kDirectoryFlags));
+  KernfsHandle handle(static_cast<uint64_t>(id));
+  opened = UniqueFd(::open_by_handle_at(anyDirectory, handle.get(), kDirectoryFlags));
   return opened ? 0 : errno;
 }
 
