@@ -10,7 +10,7 @@
 namespace Platform {
 
 // The process that holds a lock for writing on a file, by the running kernel's list of locks.
-// Nothing when there is none but this process, or when the list does not show it: a process of
+// Empty when only this process holds it, or when the list does not show it: a process of
 // another container, or a file system whose device number the list does not have.
 std::optional<int64_t> writeLockHolder(const std::string &file);
 

@@ -74,7 +74,7 @@ class Backend {
  public:
   virtual ~Backend() = default;
 
-  // The present fields of one object; empty: there is no such object.
+  // The present fields of one object; empty: the object does not exist.
   virtual std::optional<Fields> read(const ObjectId &id) = 0;
 
   // The same, layer by layer, the most particular first; layers without the object are left out.

@@ -98,7 +98,7 @@ class RunOfProcess {
   bool isThisOne() const { return isThisProcess() && file_ == configurationFile(); }
   bool isThisProcess() const { return process_ == getpid(); }
 
-  // Null: there is no such store. A failure to open an etcd store lasts for the run.
+  // Null: the store does not exist. A failure to open an etcd store lasts for the run.
   std::shared_ptr<OpenStore> store() {
     if (!problem_.empty()) throw ConfigStoreException(problem_);
     if (open_) {

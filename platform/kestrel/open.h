@@ -14,7 +14,7 @@ namespace Kestrel {
 // kCreate makes a missing store; the others return null for it.
 enum class Access { kRead, kChange, kCreate };
 
-// Null: there is no store. Throws a ConfigStoreException for a store that cannot be used.
+// Null: the store does not exist. Throws a ConfigStoreException for a store that cannot be used.
 std::shared_ptr<Backend> openBackend(const Configuration &configuration, Access access);
 
 // The same, with the configuration file read now.

@@ -12,7 +12,7 @@
 
 namespace Kestrel {
 
-// Null: there is no such file, and the access does not make one.
+// Null: the file does not exist, and the access does not make one.
 std::shared_ptr<Backend> openSqliteBackend(const Configuration &configuration, Access access);
 
 }  // namespace Kestrel

@@ -29,7 +29,7 @@ struct FileState {
   }
 };
 
-// Empty: there is no such file. Throws a ConfigStoreException when that cannot be determined.
+// Empty: the file does not exist. Throws a ConfigStoreException when that cannot be determined.
 std::optional<FileState> fileState(const std::string &path);
 
 // A file opened for reading. Usually SQLite takes part in the locking of a WAL database. Where it

@@ -42,7 +42,7 @@ struct Field {
   void (*read)(const Reading &to, const YAML::Node &value);
 };
 
-// There is no key for cpu.minLimit: it always keeps its default.
+// No key sets cpu.minLimit: it always keeps its default.
 constexpr Field kFields[] = {
     {"name", [](auto &to, auto &value) { to.pool.name = Yaml::scalarText(value); }},
     {"mem", [](auto &to, auto &value) { to.pool.mem.min = to.pool.mem.max = to.memory(value); }},

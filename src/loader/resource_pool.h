@@ -15,7 +15,7 @@ namespace Loader {
 
 // The constructor sets every member or throws. Commands read the members; unload also replaces mem
 // and cpu by the settings of the live group. The two records are the packed ones of the kernel's
-// interface, so there is no padding between the members.
+// interface, so the members have no padding between them.
 struct ResourcePoolImpl {
   // Reads one item of a definition file, a mapping. Throws Loader::Exception with the place of the
   // fault, the yaml library's errors, and any exception from the conversion of a value.

@@ -49,7 +49,7 @@ enum class Undeclared { kReport, kLeaveOut };
 std::vector<Difference> compare(const std::vector<DeclaredPool> &pools,
                                 const std::vector<KernelGroup> &groups, Undeclared undeclared);
 
-// A table for people; empty when there is no difference.
+// A table for people; empty when nothing differs.
 std::string differenceTable(const std::vector<Difference> &differences);
 
 // One JSON document of docs/poolctl-plan.schema.json.

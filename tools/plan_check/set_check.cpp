@@ -25,7 +25,7 @@ constexpr int64_t kHighShares = -4;
 // No process can live in less.
 constexpr int64_t kMinUsefulMB = 4;
 
-// Nobody has this many MB, but many have as many KB or bytes.
+// No machine has this many MB, but many have as many KB or bytes.
 constexpr int64_t kSuspiciousMB = 1048576;
 
 // Someone who writes less has most likely counted CPUs.

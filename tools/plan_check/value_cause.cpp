@@ -15,7 +15,7 @@
 namespace Plan {
 namespace {
 
-// std::regex needs stack for each byte; nobody writes a number of that length.
+// std::regex needs stack for each byte; a number of that length is not meant as one.
 constexpr size_t kMaxLength = 200;
 
 bool matches(const std::string &text, const char *pattern, std::smatch *match = nullptr) {

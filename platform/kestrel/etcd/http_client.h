@@ -44,7 +44,7 @@ struct HttpResponse {
   long status = 0;
   std::string body;
   bool sent = false;    // the server may have received the request, and acted on it
-  std::string problem;  // why there is no response, in words
+  std::string problem;  // why the response is missing, in words
 };
 
 // One thread at a time.

@@ -34,7 +34,7 @@ class LastKnownGood {
   // the same values and is younger than an hour. Returns why it could not be written; "": it was.
   std::string write(const StoredValues &values) const;
 
-  // false, with the reason in *WHY and *VALUES untouched: there are no values that may be used.
+  // false, with the reason in *WHY and *VALUES untouched: no stored values may be used.
   bool read(StoredValues *values, std::string *why) const;
 
  private:

@@ -29,7 +29,7 @@ std::string keyRoot(const std::string &prefix);
 std::string objectPart(const ObjectId &id);
 std::string selectionPart(const Selection &selection);
 
-// The id that objectKey() makes this key of. Empty: there is no such id.
+// The id that objectKey() makes this key of. Empty: not the key of an id.
 std::optional<ObjectId> objectId(const std::string &prefix, const std::string &key);
 
 // What the keys of all selected objects, and no others, begin with.

@@ -58,7 +58,7 @@ struct ReadResponse {
 // keys is still the one that is known.
 struct KeyChange {
   std::string key;
-  int64_t modRevision = 0;           // 0: there is no such key
+  int64_t modRevision = 0;           // 0: the key does not exist
   std::optional<std::string> value;  // empty: the key is deleted
 };
 

@@ -19,7 +19,7 @@ namespace Knob::Linux {
 // A control file whose text is not what the record asks for.
 struct Deviation {
   ControlText expected;
-  std::optional<std::string> actual;  // absent: there is no such file
+  std::optional<std::string> actual;  // absent: the file does not exist
 };
 
 // "memory.max is 5, not max".

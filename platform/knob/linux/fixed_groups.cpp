@@ -43,7 +43,7 @@ GroupPtr makeIfMissing(CgroupTree &tree, Group *parent, const std::string &path)
   return tree.lookUp(path);
 }
 
-// Whether there are no groups but the two.
+// Whether the two fixed groups are the only ones.
 bool isUntouched(CgroupTree &tree, const Group &host) {
   for (const Child &child : readChildren(host.fd())) {
     if (child.name != kFixedChildName) return false;
